@@ -1,0 +1,47 @@
+#!/usr/bin/env bash
+# Set-up, build and run. Usage: ./run.sh test
+set -euo pipefail
+cd "$(dirname "$0")"
+
+PACKAGES=(cmake ninja-build g++ pkg-config ccache qt6-base-dev libgtest-dev libgmock-dev
+    libcpp-httplib-dev libssl-dev)
+
+as_root() {
+    if [ "$(id -u)" -eq 0 ]; then "$@"; else sudo "$@"; fi
+}
+
+# Installs the Debian packages that are not there yet; a second run does nothing.
+ensure_packages() {
+    local missing=()
+    for package in "$@"; do
+        dpkg-query -W -f='${Status}' "$package" 2>/dev/null | grep -q "install ok installed" ||
+            missing+=("$package")
+    done
+    if [ ${#missing[@]} -gt 0 ]; then
+        echo "installing: ${missing[*]}"
+        as_root apt-get update -qq
+        as_root env DEBIAN_FRONTEND=noninteractive \
+            apt-get install -y -qq --no-install-recommends "${missing[@]}" >/dev/null
+    fi
+}
+
+# build DIR BUILD_TYPE [cmake options...]
+build() {
+    local dir=$1 type=$2
+    shift 2
+    cmake -S . -B "$dir" -G Ninja -DCMAKE_BUILD_TYPE="$type" "$@" >/dev/null
+    cmake --build "$dir" -- -j"$(nproc)"
+}
+
+command=${1:-}
+case "$command" in
+test)
+    ensure_packages "${PACKAGES[@]}"
+    build build Debug
+    (cd build && ctest --output-on-failure --timeout 300 -j"$(nproc)")
+    ;;
+*)
+    echo "usage: $0 test" >&2
+    exit 2
+    ;;
+esac

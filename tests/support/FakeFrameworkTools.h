@@ -1,0 +1,42 @@
+#pragma once
+
+#include "FakeRequestChannel.h"
+#include "PluginFramework.h"
+
+#include <QList>
+#include <QObject>
+
+// Framework tools for tests: records signal connections and events, and connects signals of a
+// registered object for real.
+class FakeFrameworkTools : public IFrameworkTools, public IPluginConnector {
+public:
+    struct Connection {
+        QString pluginId;
+        QByteArray signal;
+        const QObject* receiver = nullptr;
+        QByteArray method;
+        int connectionType = -1;
+        bool connected = false;
+    };
+
+    FakeFrameworkTools();
+
+    QString GetFrameworkVersion() const override;
+    IPluginConnector* GetPluginConnector() override;
+    QVariantMap GetPluginMetaData(const QString& pluginId) const override;
+    IPluginRequestChannel* GetRequestChannel() override;
+    EventEmitter& GetEventEmitter() override;
+
+    bool ConnectPluginSignal(const QString& pluginId, const char* signal, const QObject* receiver,
+                             const char* method, int connectionType) override;
+
+    // The object that plays the plugin pluginId for ConnectPluginSignal.
+    void registerPlugin(const QString& pluginId, QObject* plugin);
+
+    FakeRequestChannel channel;
+    EventEmitter emitter;
+    QList<Connection> connections;
+
+private:
+    QHash<QString, QObject*> plugins;
+};
