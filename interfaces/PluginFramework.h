@@ -11,8 +11,7 @@
 #define QUENVAR_PLUGIN_INTERFACE_IID "com.MERIDOX.PluginServer.PluginInterface"
 
 // Answer channel of IPluginObjectBase::Request: (handled, result code, message, payload).
-using ResponseCallback =
-    std::function<void(bool, const QString&, const QString&, const QVariant&)>;
+using ResponseCallback = std::function<void(bool, const QString&, const QString&, const QVariant&)>;
 
 class PluginObjBase_EventInfoBase {
 public:
@@ -33,8 +32,8 @@ public:
 using EventEmitter = std::function<void(PluginObjBase_EventInfoBase*)>;
 
 // Answer to an inter-plugin request: (success, message, relayPath, statusCode, replyText, flag).
-using PluginReplyCallback = std::function<void(bool, const QString&, const QString&,
-                                               const QString&, const QString&, bool)>;
+using PluginReplyCallback =
+    std::function<void(bool, const QString&, const QString&, const QString&, const QString&, bool)>;
 
 // Lives only during IPluginRequestChannel::SendRequest; the host copies what it keeps.
 struct PluginRequestInfo {
@@ -108,8 +107,7 @@ public:
     virtual void AllPluginLoaded() {}
     virtual void PluginStopping() {}
     virtual void SettingsChanged() {}
-    virtual QVariant QueryStatus(const QString& key)
-    {
+    virtual QVariant QueryStatus(const QString& key) {
         Q_UNUSED(key);
         return {};
     }

@@ -1,11 +1,11 @@
 #include "PluginQuenvar.h"
 
 #include "PluginQuenvarDefs.h"
+#include "QUILImplementation/VcaRuleRetriever.h"
 #include "ScopedTrace.h"
 #include "SubscriberList.h"
 #include "TraceLog.h"
 #include "camera/CameraProxy.h"
-#include "QUILImplementation/VcaRuleRetriever.h"
 
 #include <QTimer>
 
@@ -18,28 +18,23 @@ const int VCA_CHANGE_DELAY_MS = 2000;
 const QString CODE_OK = QStringLiteral("0");
 const QString CODE_FAILED = QStringLiteral("-1");
 
-void answer(const ResponseCallback& callback, bool ok, const QVariant& payload)
-{
+void answer(const ResponseCallback& callback, bool ok, const QVariant& payload) {
     if (callback)
         callback(true, ok ? CODE_OK : CODE_FAILED, QString(), payload);
 }
 
-std::function<void(bool, const QVariantMap&)> mapResultAdapter(const ResponseCallback& callback)
-{
-    return [callback](bool ok, const QVariantMap& result) {
-        answer(callback, ok, QVariant(result));
-    };
+std::function<void(bool, const QVariantMap&)> mapResultAdapter(const ResponseCallback& callback) {
+    return
+        [callback](bool ok, const QVariantMap& result) { answer(callback, ok, QVariant(result)); };
 }
 
-std::function<void(bool)> noResultAdapter(const ResponseCallback& callback)
-{
+std::function<void(bool)> noResultAdapter(const ResponseCallback& callback) {
     return [callback](bool ok) { answer(callback, ok, QVariant()); };
 }
 
 // The preset adapters keep the camera's host for their failure message.
 std::function<void(bool, const QVariant&)> presetAdapter(const ResponseCallback& callback,
-                                                         const QVariantMap& params)
-{
+                                                         const QVariantMap& params) {
     return [callback, host = params.value(KEY_HOST).toString()](bool ok, const QVariant& result) {
         if (!ok)
             TraceLog::print(TraceLog::Failure, SOURCE_FILE, __LINE__,
@@ -51,8 +46,7 @@ std::function<void(bool, const QVariant&)> presetAdapter(const ResponseCallback&
 }
 
 std::function<void(bool, QList<QString>)> presetListAdapter(const ResponseCallback& callback,
-                                                            const QVariantMap& params)
-{
+                                                            const QVariantMap& params) {
     return [callback, host = params.value(KEY_HOST).toString()](bool ok, QList<QString> presets) {
         if (!ok)
             TraceLog::print(TraceLog::Failure, SOURCE_FILE, __LINE__,
@@ -109,17 +103,13 @@ const CameraCommand CAMERA_COMMANDS[] = {
 } // namespace
 
 PluginQuenvar::PluginQuenvar()
-    : subscribers(std::make_shared<SubscriberList>())
-{
-}
+    : subscribers(std::make_shared<SubscriberList>()) {}
 
-PluginQuenvar::~PluginQuenvar()
-{
+PluginQuenvar::~PluginQuenvar() {
     ScopedTrace trace("PluginQuenvar::~PluginQuenvar", SOURCE_FILE, __LINE__);
 }
 
-bool PluginQuenvar::InitialPluginBase(IFrameworkTools* tools)
-{
+bool PluginQuenvar::InitialPluginBase(IFrameworkTools* tools) {
     ScopedTrace trace("PluginQuenvar::InitialPluginBase", SOURCE_FILE, __LINE__);
     vcaRuleRetriever = std::make_shared<VcaRuleRetriever>(tools);
     cameraProxy = std::make_shared<CameraProxy>();
@@ -128,8 +118,7 @@ bool PluginQuenvar::InitialPluginBase(IFrameworkTools* tools)
     return true;
 }
 
-void PluginQuenvar::AllPluginLoaded()
-{
+void PluginQuenvar::AllPluginLoaded() {
     if (pluginConnector)
         pluginConnector->ConnectPluginSignal(VCA_PLUGIN_ID, "2vcaMetadataChanged(const QString &)",
                                              this, "1vcaMetadataChanged(const QString &)",
@@ -137,8 +126,7 @@ void PluginQuenvar::AllPluginLoaded()
 }
 
 void PluginQuenvar::Request(const QString& command, const QVariant& params,
-                            const RequestSenderInfo& sender, ResponseCallback callback)
-{
+                            const RequestSenderInfo& sender, ResponseCallback callback) {
     Q_UNUSED(sender);
     ScopedTrace trace("PluginQuenvar::Request", SOURCE_FILE, __LINE__);
     try {
@@ -181,8 +169,7 @@ void PluginQuenvar::Request(const QString& command, const QVariant& params,
 }
 
 void PluginQuenvar::RequestBlock(const QString& command, const QVariant& params,
-                                 const RequestSenderInfo& sender, IResponser& responser)
-{
+                                 const RequestSenderInfo& sender, IResponser& responser) {
     Q_UNUSED(command);
     Q_UNUSED(params);
     Q_UNUSED(sender);
@@ -192,8 +179,7 @@ void PluginQuenvar::RequestBlock(const QString& command, const QVariant& params,
 
 void PluginQuenvar::SubscribeEventBlock(const QString& subscriberId, const QString& eventName,
                                         const QVariant& params, const RequestSenderInfo& sender,
-                                        IResponser& responser)
-{
+                                        IResponser& responser) {
     Q_UNUSED(eventName);
     Q_UNUSED(params);
     Q_UNUSED(sender);
@@ -203,33 +189,28 @@ void PluginQuenvar::SubscribeEventBlock(const QString& subscriberId, const QStri
 }
 
 void PluginQuenvar::UnsubscribeEventBlock(const QString& subscriberId, const QVariant& params,
-                                          IResponser& responser)
-{
+                                          IResponser& responser) {
     Q_UNUSED(params);
     Q_UNUSED(responser);
     ScopedTrace trace("PluginQuenvar::UnsubscribeEventBlock", SOURCE_FILE, __LINE__);
     subscribers->unsubscribe(subscriberId);
 }
 
-void PluginQuenvar::setCameraProxy(std::shared_ptr<ICameraProxy> proxy)
-{
+void PluginQuenvar::setCameraProxy(std::shared_ptr<ICameraProxy> proxy) {
     cameraProxy = std::move(proxy);
 }
 
-void PluginQuenvar::setVcaRuleRetriever(std::shared_ptr<VcaRuleRetriever> retriever)
-{
+void PluginQuenvar::setVcaRuleRetriever(std::shared_ptr<VcaRuleRetriever> retriever) {
     vcaRuleRetriever = std::move(retriever);
 }
 
-void PluginQuenvar::vcaMetadataChanged(const QString& cameraID)
-{
+void PluginQuenvar::vcaMetadataChanged(const QString& cameraID) {
     // Bound to this object: a pending fetch dies with it.
     QTimer::singleShot(VCA_CHANGE_DELAY_MS, Qt::CoarseTimer, this,
                        [this, cameraID]() { handleVCAMetadataChanged(cameraID); });
 }
 
-void PluginQuenvar::handleVCAMetadataChanged(const QString& cameraID)
-{
+void PluginQuenvar::handleVCAMetadataChanged(const QString& cameraID) {
     const auto retriever = vcaRuleRetriever;
     if (!retriever)
         return;

@@ -4,7 +4,6 @@
 #include "QuenvarExport.h"
 
 #include <QObject>
-#include <QStringList>
 
 #include <memory>
 

@@ -50,6 +50,10 @@ static const QString EVENT_LIVE_VCA_RULE_CHANGED = QStringLiteral("liveVCARuleCh
 static const QString VCA_CMD_GET_VCA_RULES = QStringLiteral("GetVCARules");
 static const QString VCA_GET_VCA_RULES_FORMAT =
     QStringLiteral("<GetVCARules><Cam>%1</Cam></GetVCARules>");
+static const QString VCA_CMD_GET_RECORDING_VCA_RULES = QStringLiteral("GetRecordingVCARules");
+static const QString VCA_GET_RECORDING_VCA_RULES_FORMAT =
+    QStringLiteral("<GetRecordingVCARules><QueryTime>%1</QueryTime>%2</GetRecordingVCARules>");
+static const QString VCA_LOCATION_FORMAT = QStringLiteral("<Loc>%1</Loc>");
 static const QString VCA_KEY_CAM_ID = QStringLiteral("camID");
 static const QString VCA_KEY_IS_JSON = QStringLiteral("isJSON");
 static const QString VCA_KEY_RELAY_PATH = QStringLiteral("relayPath");

@@ -2,33 +2,23 @@
 
 #include <QDateTime>
 
-void SubscriberList::setEmitter(const EventEmitter& emitter)
-{
+void SubscriberList::setEmitter(const EventEmitter& emitter) {
     std::lock_guard<std::mutex> lock(mutex);
     eventEmitter = emitter;
 }
 
-void SubscriberList::subscribe(const QString& subscriberId)
-{
+void SubscriberList::subscribe(const QString& subscriberId) {
     std::lock_guard<std::mutex> lock(mutex);
     subscribers.append(subscriberId);
 }
 
-void SubscriberList::unsubscribe(const QString& subscriberId)
-{
+void SubscriberList::unsubscribe(const QString& subscriberId) {
     std::lock_guard<std::mutex> lock(mutex);
     subscribers.removeAll(subscriberId);
 }
 
-QStringList SubscriberList::subscriberIds() const
-{
-    std::lock_guard<std::mutex> lock(mutex);
-    return subscribers;
-}
-
 void SubscriberList::emitToAll(const QVariant& data, const QString& eventName,
-                               const QString& sourcePluginId) const
-{
+                               const QString& sourcePluginId) const {
     QStringList targets;
     EventEmitter emitter;
     {

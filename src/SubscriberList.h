@@ -17,7 +17,6 @@ public:
     void subscribe(const QString& subscriberId);
     // Removes every entry equal to subscriberId.
     void unsubscribe(const QString& subscriberId);
-    QStringList subscriberIds() const;
 
     // One record per subscriber, in order of subscription, each with its own timestamp.
     void emitToAll(const QVariant& data, const QString& eventName,

@@ -24,8 +24,7 @@ const char MODULE_NAME[] = "Quenvar";
 // never in the working directory, so a file planted there cannot be loaded into the host.
 class TraceLibrary {
 public:
-    TraceLibrary()
-    {
+    TraceLibrary() {
         handle = open();
         if (!handle)
             return;
@@ -34,12 +33,11 @@ public:
             return;
         entry(0, &traceObject);
         if (traceObject && traceObject->RegisterModule)
-            traceObject->RegisterModule(traceObject->context, KALBLOG_REGISTER_VERSION,
-                                        MODULE_NAME, &moduleId);
+            traceObject->RegisterModule(traceObject->context, KALBLOG_REGISTER_VERSION, MODULE_NAME,
+                                        &moduleId);
     }
 
-    ~TraceLibrary()
-    {
+    ~TraceLibrary() {
         traceObject = nullptr;
         if (handle)
             close();
@@ -48,8 +46,8 @@ public:
     TraceLibrary(const TraceLibrary&) = delete;
     TraceLibrary& operator=(const TraceLibrary&) = delete;
 
-    void print(int level, const char* sourceFile, int line, const char* format, va_list args) const
-    {
+    void print(int level, const char* sourceFile, int line, const char* format,
+               va_list args) const {
         const KalbTraceObject* object = traceObject;
         if (!object || !object->context || !object->Filter)
             return;
@@ -61,8 +59,7 @@ public:
 
 private:
 #if defined(_WIN32)
-    static std::string moduleFolder()
-    {
+    static std::string moduleFolder() {
         HMODULE self = nullptr;
         if (!GetModuleHandleExA(GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS |
                                     GET_MODULE_HANDLE_EX_FLAG_UNCHANGED_REFCOUNT,
@@ -77,8 +74,7 @@ private:
         return slash == std::string::npos ? std::string() : folder.substr(0, slash + 1);
     }
 
-    void* open() const
-    {
+    void* open() const {
         const std::string folder = moduleFolder();
         if (!folder.empty()) {
             if (HMODULE module = LoadLibraryExA((folder + LIBRARY_NAME).c_str(), nullptr,
@@ -87,14 +83,14 @@ private:
         }
         return LoadLibraryExA(LIBRARY_NAME, nullptr, LOAD_LIBRARY_SEARCH_DEFAULT_DIRS);
     }
-    void* symbol(const char* name) const
-    {
+    void* symbol(const char* name) const {
         return reinterpret_cast<void*>(GetProcAddress(static_cast<HMODULE>(handle), name));
     }
-    void close() const { FreeLibrary(static_cast<HMODULE>(handle)); }
+    void close() const {
+        FreeLibrary(static_cast<HMODULE>(handle));
+    }
 #else
-    static std::string moduleFolder()
-    {
+    static std::string moduleFolder() {
         Dl_info info{};
         if (!dladdr(reinterpret_cast<void*>(&moduleFolder), &info) || !info.dli_fname)
             return {};
@@ -103,8 +99,7 @@ private:
         return slash == std::string::npos ? std::string() : path.substr(0, slash + 1);
     }
 
-    void* open() const
-    {
+    void* open() const {
         const std::string folder = moduleFolder();
         if (!folder.empty()) {
             if (void* module = dlopen((folder + LIBRARY_NAME).c_str(), RTLD_NOW | RTLD_LOCAL))
@@ -113,8 +108,12 @@ private:
         // A bare name: the search path of this module and the system, not the working folder.
         return dlopen(LIBRARY_NAME, RTLD_NOW | RTLD_LOCAL);
     }
-    void* symbol(const char* name) const { return dlsym(handle, name); }
-    void close() const { dlclose(handle); }
+    void* symbol(const char* name) const {
+        return dlsym(handle, name);
+    }
+    void close() const {
+        dlclose(handle);
+    }
 #endif
 
     void* handle = nullptr;
@@ -126,8 +125,7 @@ const TraceLibrary library;
 
 } // namespace
 
-void TraceLog::print(int level, const char* sourceFile, int line, const char* format, ...)
-{
+void TraceLog::print(int level, const char* sourceFile, int line, const char* format, ...) {
     va_list args;
     va_start(args, format);
     library.print(level, sourceFile, line, format, args);

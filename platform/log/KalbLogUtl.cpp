@@ -28,8 +28,7 @@ struct Logger {
     FILE* out = stderr;
     bool ownsOut = false;
 
-    Logger()
-    {
+    Logger() {
         if (const char* level = std::getenv("KALBLOG_LEVEL")) {
             char* end = nullptr;
             const long value = std::strtol(level, &end, 10);
@@ -46,15 +45,13 @@ struct Logger {
         }
     }
 
-    ~Logger()
-    {
+    ~Logger() {
         if (ownsOut)
             std::fclose(out);
     }
 };
 
-Logger& logger()
-{
+Logger& logger() {
     static Logger instance;
     return instance;
 }
@@ -67,8 +64,7 @@ struct PendingMessage {
 };
 thread_local PendingMessage pending;
 
-int registerModule(void* context, int, const char* name, unsigned* moduleId)
-{
+int registerModule(void* context, int, const char* name, unsigned* moduleId) {
     auto* log = static_cast<Logger*>(context);
     if (!log || !name || !moduleId)
         return -1;
@@ -84,8 +80,7 @@ int registerModule(void* context, int, const char* name, unsigned* moduleId)
     return 0;
 }
 
-int filter(void* context, unsigned code, int, const char* sourceFile, int line)
-{
+int filter(void* context, unsigned code, int, const char* sourceFile, int line) {
     auto* log = static_cast<Logger*>(context);
     if (!log || static_cast<int>(code & 0xffu) > log->maxLevel)
         return 1;
@@ -93,8 +88,7 @@ int filter(void* context, unsigned code, int, const char* sourceFile, int line)
     return 0;
 }
 
-std::string timestamp()
-{
+std::string timestamp() {
     using namespace std::chrono;
     const auto now = system_clock::now();
     const std::time_t seconds = system_clock::to_time_t(now);
@@ -113,8 +107,7 @@ std::string timestamp()
     return withMillis;
 }
 
-void print(void* context, const char* format, va_list args)
-{
+void print(void* context, const char* format, va_list args) {
     auto* log = static_cast<Logger*>(context);
     if (!log || !format)
         return;
@@ -139,8 +132,7 @@ void print(void* context, const char* format, va_list args)
     std::fflush(log->out);
 }
 
-KalbTraceObject makeTraceObject()
-{
+KalbTraceObject makeTraceObject() {
     KalbTraceObject object{};
     object.context = &logger();
     object.RegisterModule = &registerModule;
@@ -151,8 +143,7 @@ KalbTraceObject makeTraceObject()
 
 } // namespace
 
-KALBLOG_API int LogTrace_GetGlobalObject(int, KalbTraceObject** traceObject)
-{
+KALBLOG_API int LogTrace_GetGlobalObject(int, KalbTraceObject** traceObject) {
     static KalbTraceObject object = makeTraceObject();
     if (!traceObject)
         return -1;

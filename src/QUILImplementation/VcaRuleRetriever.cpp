@@ -1,12 +1,30 @@
-#include "VcaRuleRetriever.h"
+#include "QUILImplementation/VcaRuleRetriever.h"
 
-class VcaRuleRetriever::VcaRuleRetrieverPrivate {};
+#include "QUILImplementation/VcaRuleRetrieverPrivate.h"
 
 VcaRuleRetriever::VcaRuleRetriever() = default;
-VcaRuleRetriever::VcaRuleRetriever(IFrameworkTools*) {}
+
+VcaRuleRetriever::VcaRuleRetriever(IFrameworkTools* tools)
+    : d(std::make_shared<VcaRuleRetrieverPrivate>()) {
+    if (tools)
+        d->requestChannel = tools->GetRequestChannel();
+}
+
 VcaRuleRetriever::VcaRuleRetriever(const VcaRuleRetriever& other) = default;
 VcaRuleRetriever& VcaRuleRetriever::operator=(const VcaRuleRetriever& other) = default;
 VcaRuleRetriever::~VcaRuleRetriever() = default;
 
-void VcaRuleRetriever::getLiveVcaRule(const QString&, ResponseCallback) {}
-void VcaRuleRetriever::getRecordingVcaRule(const QList<QString>&, quint64, ResponseCallback) {}
+void VcaRuleRetriever::getLiveVcaRule(const QString& cameraId, ResponseCallback callback) {
+    if (d)
+        d->getLiveVcaRule(cameraId, std::move(callback));
+    else if (callback)
+        callback(false, QStringLiteral("-1"), QString(), QVariant());
+}
+
+void VcaRuleRetriever::getRecordingVcaRule(const QList<QString>& locationIDs, quint64 timestamp,
+                                           ResponseCallback callback) {
+    if (d)
+        d->getRecordingVcaRule(locationIDs, timestamp, std::move(callback));
+    else if (callback)
+        callback(false, QStringLiteral("-1"), QString(), QVariant());
+}

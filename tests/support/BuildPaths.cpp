@@ -2,23 +2,19 @@
 
 #include <QtGlobal>
 
-QString BuildPaths::root()
-{
+QString BuildPaths::root() {
     const QString fromEnvironment = qEnvironmentVariable("QUENVAR_BUILD_DIR");
     return fromEnvironment.isEmpty() ? QStringLiteral(QUENVAR_DEFAULT_BUILD_DIR) : fromEnvironment;
 }
 
-QString BuildPaths::bin(const QString& name)
-{
+QString BuildPaths::bin(const QString& name) {
     return root() + QStringLiteral("/bin/") + name;
 }
 
-QString BuildPaths::plugins()
-{
+QString BuildPaths::plugins() {
     return root() + QStringLiteral("/plugins");
 }
 
-QString BuildPaths::lib()
-{
+QString BuildPaths::lib() {
     return root() + QStringLiteral("/lib");
 }

@@ -1,39 +1,31 @@
 #include "FakeFrameworkTools.h"
 
 FakeFrameworkTools::FakeFrameworkTools()
-    : emitter([](PluginObjBase_EventInfoBase*) {})
-{
-}
+    : emitter([](PluginObjBase_EventInfoBase*) {}) {}
 
-QString FakeFrameworkTools::GetFrameworkVersion() const
-{
+QString FakeFrameworkTools::GetFrameworkVersion() const {
     return QStringLiteral("test");
 }
 
-IPluginConnector* FakeFrameworkTools::GetPluginConnector()
-{
+IPluginConnector* FakeFrameworkTools::GetPluginConnector() {
     return this;
 }
 
-QVariantMap FakeFrameworkTools::GetPluginMetaData(const QString&) const
-{
+QVariantMap FakeFrameworkTools::GetPluginMetaData(const QString&) const {
     return {};
 }
 
-IPluginRequestChannel* FakeFrameworkTools::GetRequestChannel()
-{
+IPluginRequestChannel* FakeFrameworkTools::GetRequestChannel() {
     return &channel;
 }
 
-EventEmitter& FakeFrameworkTools::GetEventEmitter()
-{
+EventEmitter& FakeFrameworkTools::GetEventEmitter() {
     return emitter;
 }
 
 bool FakeFrameworkTools::ConnectPluginSignal(const QString& pluginId, const char* signal,
                                              const QObject* receiver, const char* method,
-                                             int connectionType)
-{
+                                             int connectionType) {
     Connection connection{pluginId, signal, receiver, method, connectionType, false};
     if (QObject* plugin = plugins.value(pluginId))
         connection.connected = static_cast<bool>(QObject::connect(
@@ -42,7 +34,6 @@ bool FakeFrameworkTools::ConnectPluginSignal(const QString& pluginId, const char
     return connection.connected;
 }
 
-void FakeFrameworkTools::registerPlugin(const QString& pluginId, QObject* plugin)
-{
+void FakeFrameworkTools::registerPlugin(const QString& pluginId, QObject* plugin) {
     plugins.insert(pluginId, plugin);
 }

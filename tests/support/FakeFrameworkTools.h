@@ -8,7 +8,9 @@
 
 // Framework tools for tests: records signal connections and events, and connects signals of a
 // registered object for real.
-class FakeFrameworkTools : public IFrameworkTools, public IPluginConnector {
+class FakeFrameworkTools
+    : public IFrameworkTools
+    , public IPluginConnector {
 public:
     struct Connection {
         QString pluginId;

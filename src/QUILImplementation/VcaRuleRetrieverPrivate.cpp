@@ -1,0 +1,337 @@
+#include "QUILImplementation/VcaRuleRetrieverPrivate.h"
+
+#include "PluginQuenvarDefs.h"
+#include "TraceLog.h"
+#include "Trindle.h"
+
+#include <QByteArray>
+#include <QJsonDocument>
+#include <QJsonValue>
+#include <QRegularExpression>
+#include <QUrl>
+
+#include <exception>
+
+namespace {
+
+const char SOURCE_FILE[] = "src/QUILImplementation/VcaRuleRetriever";
+// The recording failures are reported at these lines whatever the layout of this file: log
+// filters and the people reading the logs know them by them.
+const int RECORDING_STATUS_FAILURE_LINE = 195;
+const int RECORDING_PARSE_FAILURE_LINE = 204;
+
+const qint32 REQUEST_TIMEOUT_MS = 15000;
+const int LIVE_REQUEST_KIND = 1;
+const int RECORDING_REQUEST_KIND = 4;
+
+const QString CODE_OK = QStringLiteral("0");
+const QString CODE_FAILED = QStringLiteral("-1");
+
+// Names in the parsed replies.
+const QString LIVE_ROOT = QStringLiteral("GetVCARulesRes");
+const QString CAMERA = QStringLiteral("Camera");
+const QString CAM_NAME = QStringLiteral("CamName");
+const QString RULES = QStringLiteral("Rules");
+const QString RULE = QStringLiteral("Rule");
+const QString FORMAT_ATTRIBUTE = QStringLiteral("@Format");
+const QString TYPE_ATTRIBUTE = QStringLiteral("@Type");
+const QString NAME_ATTRIBUTE = QStringLiteral("@Name");
+const QString TEXT = QStringLiteral("#text");
+const QString RECORDING_ROOT = QStringLiteral("GetRecordingVCARulesRes");
+const QString LOCATION = QStringLiteral("Location");
+const QString LOC_NAME = QStringLiteral("LocName");
+const QString JSON_RULES = QStringLiteral("JsonRules");
+const QString PROJECTION = QStringLiteral("Projection");
+const QString ANALYSIS_ENGINE = QStringLiteral("AnalysisEngine");
+const QString JSON_FORMAT = QStringLiteral("json");
+
+// A rule's text is read as the value of this member, so that its name needs no escaping.
+const QString WRAP_KEY = QStringLiteral("v");
+const QByteArray WRAP_OPEN = QByteArrayLiteral("{\"v\":");
+
+const QString XML_DECLARATION = QStringLiteral("<?xml version='1.0' encoding='UTF-8'?>");
+const QString EMPTY_RULES = QStringLiteral("<Rules></Rules>");
+const QString RECORDING_XML_RULES_PREFIX = QStringLiteral(
+    "<?xml version='1.0' encoding='UTF-8'?><Projection /><AE /><Rules Format = \"xml\">");
+const QString RECORDING_XML_RULES_SUFFIX = QStringLiteral("</Rules>");
+const QString EMPTY_JSON_OBJECT = QStringLiteral("{}");
+
+const QRegularExpression CAM_NAME_START(QStringLiteral("<CamName>[^<]+"));
+const QString CAM_NAME_END = QStringLiteral("</CamName>");
+const qsizetype CAM_NAME_START_LENGTH = 9;
+const QRegularExpression LIVE_ROOT_TAG(QStringLiteral("</?GetVCARulesRes>"));
+const QRegularExpression CAMERA_TAG(QStringLiteral("</?Camera>"));
+const QRegularExpression CAM_NAME_ELEMENT(QStringLiteral("<CamName>[^<]+</CamName>"));
+const QString CR_LF = QStringLiteral("\r\n");
+const QRegularExpression
+    JSON_RULES_ELEMENT(QStringLiteral("<JsonRules>(.*?)<\\/JsonRules>|<JsonRules*.\\/>"));
+
+QVariant valueAt(const QVariant& node, const QString& key) {
+    return node.toMap().value(key);
+}
+
+QString percentDecoded(const QString& text) {
+    return QUrl::fromPercentEncoding(text.toUtf8());
+}
+
+QString decodedOrEmptyObject(const QVariantMap& location, const QString& key) {
+    const auto it = location.constFind(key);
+    return it == location.constEnd() ? EMPTY_JSON_OBJECT : percentDecoded(it.value().toString());
+}
+
+// Keeps an identifier from adding elements to a command; ordinary identifiers pass unchanged.
+QString xmlEscaped(const QString& text) {
+    return text.toHtmlEscaped().replace(QLatin1Char('\''), QLatin1String("&apos;"));
+}
+
+// Spaces and tabs go from element text, stay in tags and before the first '>'.
+QString withoutTextBlanks(const QString& text) {
+    QString copy(text.size(), Qt::Uninitialized);
+    QChar* out = copy.data();
+    bool inText = false;
+    for (const QChar c : text) {
+        const char16_t unit = c.unicode();
+        if (unit == u'>')
+            inText = true;
+        else if (unit == u'<')
+            inText = false;
+        else if (inText && (unit == u' ' || unit == u'\t'))
+            continue;
+        *out++ = c;
+    }
+    copy.truncate(out - copy.constData());
+    return copy;
+}
+
+void answer(const ResponseCallback& callback, bool flag, bool ok, const QVariant& payload) {
+    if (callback)
+        callback(flag, ok ? CODE_OK : CODE_FAILED, QString(), payload);
+}
+
+// The host calls reply handlers from its own code; nothing may escape into it.
+template <typename Handler>
+void guarded(const char* tag, Handler&& handler) {
+    try {
+        handler();
+    } catch (const std::exception& error) {
+        TraceLog::print(TraceLog::Failure, SOURCE_FILE, __LINE__, "%s, failed, %s", tag,
+                        error.what());
+    } catch (...) {
+        TraceLog::print(TraceLog::Failure, SOURCE_FILE, __LINE__, "%s, failed", tag);
+    }
+}
+
+} // namespace
+
+void VcaRuleRetriever::VcaRuleRetrieverPrivate::getLiveVcaRule(const QString& cameraId,
+                                                               ResponseCallback callback) {
+    if (!requestChannel) {
+        if (callback)
+            callback(false, CODE_FAILED, QString(), QVariant());
+        return;
+    }
+    PluginRequestInfo info;
+    info.flag = false;
+    info.timeoutMs = REQUEST_TIMEOUT_MS;
+    info.content = liveRequestXml(cameraId);
+    info.callback = [callback = std::move(callback)](
+                        bool success, const QString&, const QString& relayPath,
+                        const QString& statusCode, const QString& replyText, bool flag) {
+        guarded("queryLiveVCARuleCB", [&] {
+            queryLiveVCARuleCB(success, relayPath, statusCode, replyText, flag, callback);
+        });
+    };
+    const IPluginRequestChannel::Context context = requestChannel->GetRequestContext();
+    requestChannel->SendRequest(PLUGIN_ID, context, LIVE_REQUEST_KIND, VCA_CMD_GET_VCA_RULES, info);
+}
+
+void VcaRuleRetriever::VcaRuleRetrieverPrivate::getRecordingVcaRule(
+    const QList<QString>& locationIDs, quint64 timestamp, ResponseCallback callback) {
+    if (!requestChannel) {
+        if (callback)
+            callback(false, CODE_FAILED, QString(), QVariant());
+        return;
+    }
+    PluginRequestInfo info;
+    info.flag = false;
+    info.timeoutMs = REQUEST_TIMEOUT_MS;
+    info.content = recordingRequestXml(locationIDs, timestamp);
+    info.callback = [callback = std::move(callback)](bool success, const QString&, const QString&,
+                                                     const QString& statusCode,
+                                                     const QString& replyText, bool flag) {
+        guarded("queryRecordingVCARuleCB",
+                [&] { queryRecordingVCARuleCB(success, statusCode, replyText, flag, callback); });
+    };
+    const IPluginRequestChannel::Context context = requestChannel->GetRequestContext();
+    requestChannel->SendRequest(PLUGIN_ID, context, RECORDING_REQUEST_KIND,
+                                VCA_CMD_GET_RECORDING_VCA_RULES, info);
+}
+
+QString VcaRuleRetriever::VcaRuleRetrieverPrivate::liveRequestXml(const QString& cameraId) {
+    return VCA_GET_VCA_RULES_FORMAT.arg(xmlEscaped(cameraId));
+}
+
+QString
+VcaRuleRetriever::VcaRuleRetrieverPrivate::recordingRequestXml(const QList<QString>& locationIDs,
+                                                               quint64 timestamp) {
+    QString locations;
+    for (const QString& id : locationIDs)
+        locations += VCA_LOCATION_FORMAT.arg(xmlEscaped(id));
+    // The dispatcher hands over a 32-bit time; its low 32 bits are that time, sign included.
+    const auto queryTime = static_cast<qint32>(static_cast<quint32>(timestamp));
+    return VCA_GET_RECORDING_VCA_RULES_FORMAT.arg(QString::number(queryTime), locations);
+}
+
+bool VcaRuleRetriever::VcaRuleRetrieverPrivate::replyFailed(bool success,
+                                                            const QString& statusCode) {
+    if (!success)
+        return true;
+    // Text that is not hexadecimal, or too large for 32 bits, reads as 0.
+    bool ok = false;
+    const uint status = statusCode.toUInt(&ok, 16);
+    return ok && (status & 0x80000000u) != 0;
+}
+
+void VcaRuleRetriever::VcaRuleRetrieverPrivate::queryLiveVCARuleCB(
+    bool success, const QString& relayPath, const QString& statusCode, const QString& replyText,
+    bool flag, const ResponseCallback& callback) {
+    const bool failed = replyFailed(success, statusCode);
+    if (failed)
+        TraceLog::print(TraceLog::Failure, SOURCE_FILE, __LINE__, "%s, getLiveVcaRule failed, %s",
+                        "getLiveVcaRule", statusCode.toLocal8Bit().constData());
+    // A failed fetch still carries the converted map: subscribers of change events get it.
+    answer(callback, flag, !failed, QVariant(convertLiveReply(replyText, relayPath)));
+}
+
+void VcaRuleRetriever::VcaRuleRetrieverPrivate::queryRecordingVCARuleCB(
+    bool success, const QString& statusCode, const QString& replyText, bool flag,
+    const ResponseCallback& callback) {
+    if (replyFailed(success, statusCode)) {
+        TraceLog::print(TraceLog::Failure, SOURCE_FILE, RECORDING_STATUS_FAILURE_LINE,
+                        "%s, queryRecordingVCARuleCB failed, %s", "queryRecordingVCARuleCB",
+                        statusCode.toLocal8Bit().constData());
+        answer(callback, flag, false, QVariant());
+        return;
+    }
+    const QVariant result = convertRecordingReply(replyText);
+    if (!result.isValid()) {
+        TraceLog::print(TraceLog::Failure, SOURCE_FILE, RECORDING_PARSE_FAILURE_LINE,
+                        "%s, parse message failed, %s", "queryRecordingVCARuleCB",
+                        replyText.toLocal8Bit().constData());
+        answer(callback, flag, false, QVariant());
+        return;
+    }
+    answer(callback, flag, true, result);
+}
+
+QVariantMap VcaRuleRetriever::VcaRuleRetrieverPrivate::convertLiveReply(const QString& replyText,
+                                                                        const QString& relayPath) {
+    Trindle trindle;
+    const QVariant parsed = trindle.parse(replyText);
+    QVariantMap result;
+    if (isJsonFormat(parsed))
+        convertJsonRules(parsed, relayPath, result);
+    else
+        convertXmlRules(replyText, relayPath, result);
+    return result;
+}
+
+bool VcaRuleRetriever::VcaRuleRetrieverPrivate::isJsonFormat(const QVariant& parsedReply) {
+    const QVariant rules = valueAt(valueAt(valueAt(parsedReply, LIVE_ROOT), CAMERA), RULES);
+    return valueAt(rules, FORMAT_ATTRIBUTE).toString() == JSON_FORMAT;
+}
+
+void VcaRuleRetriever::VcaRuleRetrieverPrivate::convertJsonRules(const QVariant& parsedReply,
+                                                                 const QString& relayPath,
+                                                                 QVariantMap& result) {
+    const QVariantMap camera = valueAt(valueAt(parsedReply, LIVE_ROOT), CAMERA).toMap();
+    const QList<QVariant> rules = Trindle::transContentAsList(valueAt(camera.value(RULES), RULE));
+    result.insert(VCA_KEY_CAM_ID, camera.value(CAM_NAME).toString());
+    result.insert(VCA_KEY_RELAY_PATH, relayPath);
+    result.insert(VCA_KEY_IS_JSON, true);
+
+    QMap<QString, QJsonObject> rulesByType;
+    QByteArray wrapped;
+    for (const QVariant& entry : rules) {
+        const QVariantMap rule = entry.toMap();
+        const QString name = percentDecoded(rule.value(NAME_ATTRIBUTE).toString());
+        const QByteArray text = rule.value(TEXT).toString().toUtf8();
+        wrapped.resize(0);
+        wrapped.append(WRAP_OPEN).append(text).append('}');
+        const QJsonValue value = QJsonDocument::fromJson(wrapped).object().value(WRAP_KEY);
+        QJsonObject& rulesOfType = rulesByType[rule.value(TYPE_ATTRIBUTE).toString()];
+        if (value.isUndefined())
+            rulesOfType.remove(name);
+        else
+            rulesOfType.insert(name, value);
+    }
+    result.insert(VCA_KEY_RULES, rulesToJsonText(rulesByType));
+}
+
+void VcaRuleRetriever::VcaRuleRetrieverPrivate::convertXmlRules(const QString& replyText,
+                                                                const QString& relayPath,
+                                                                QVariantMap& result) {
+    QString copy = withoutTextBlanks(replyText);
+
+    QString camId;
+    const QRegularExpressionMatch start = CAM_NAME_START.match(copy);
+    const qsizetype end = copy.indexOf(CAM_NAME_END);
+    if (start.hasMatch() && end >= 0) {
+        const qsizetype first = start.capturedStart() + CAM_NAME_START_LENGTH;
+        if (end >= first)
+            camId = copy.mid(first, end - first);
+    }
+    result.insert(VCA_KEY_CAM_ID, camId);
+    result.insert(VCA_KEY_RELAY_PATH, relayPath);
+    result.insert(VCA_KEY_IS_JSON, false);
+
+    copy.remove(LIVE_ROOT_TAG);
+    copy.remove(CAMERA_TAG);
+    copy.remove(CAM_NAME_ELEMENT);
+    copy.remove(CR_LF);
+    result.insert(VCA_KEY_RULES, XML_DECLARATION + (copy.isEmpty() ? EMPTY_RULES : copy));
+}
+
+QString VcaRuleRetriever::VcaRuleRetrieverPrivate::rulesToJsonText(
+    const QMap<QString, QJsonObject>& rulesByType) {
+    QJsonObject root;
+    for (auto it = rulesByType.constBegin(); it != rulesByType.constEnd(); ++it)
+        root.insert(it.key(), it.value());
+    return QString::fromUtf8(QJsonDocument(root).toJson(QJsonDocument::Compact));
+}
+
+QVariant
+VcaRuleRetriever::VcaRuleRetrieverPrivate::convertRecordingReply(const QString& replyText) {
+    Trindle trindle;
+    const QVariant parsed = trindle.parse(replyText);
+    if (!parsed.isValid() || parsed.isNull())
+        return {};
+    const QList<QVariant> locations =
+        Trindle::transContentAsList(valueAt(valueAt(parsed, RECORDING_ROOT), LOCATION));
+    const QList<QString> contents = extractJsonRules(replyText.simplified());
+
+    QVariantMap result;
+    for (qsizetype i = 0; i < locations.size(); ++i) {
+        const QVariantMap location = locations.at(i).toMap();
+        // A location beyond the last JsonRules element gets the empty content.
+        const QString content = i < contents.size() ? contents.at(i) : QString();
+        const bool json = content.isEmpty() || content.startsWith(QLatin1Char('{'));
+        QVariantMap entry;
+        entry.insert(VCA_KEY_VCA_RULES,
+                     json ? percentDecoded(location.value(JSON_RULES).toString())
+                          : RECORDING_XML_RULES_PREFIX + content + RECORDING_XML_RULES_SUFFIX);
+        entry.insert(VCA_KEY_PROJECTION, decodedOrEmptyObject(location, PROJECTION));
+        entry.insert(VCA_KEY_ANALYSIS_ENGINE, decodedOrEmptyObject(location, ANALYSIS_ENGINE));
+        entry.insert(VCA_KEY_IS_JSON, json);
+        result.insert(location.value(LOC_NAME).toString(), entry);
+    }
+    return result;
+}
+
+QList<QString> VcaRuleRetriever::VcaRuleRetrieverPrivate::extractJsonRules(const QString& text) {
+    QList<QString> contents;
+    QRegularExpressionMatchIterator matches = JSON_RULES_ELEMENT.globalMatch(text);
+    while (matches.hasNext())
+        contents.append(matches.next().captured(1));
+    return contents;
+}

@@ -1,0 +1,5 @@
+#include "FakeResponser.h"
+
+void FakeResponser::Respond(bool, const QString&, const QString&, const QVariant&) {
+    ++count;
+}
