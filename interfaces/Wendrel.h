@@ -1,8 +1,26 @@
 // Wendrel: the ISimpleHTTPClient on Qt Network.
 //
-// Requests run on a worker thread that Wendrel owns, with its own event loop; the process needs
-// a QCoreApplication. Get/Post/... may be called from any thread. Reply callbacks are called on
-// the worker thread, exactly once for every request that was accepted (the call returned true).
+// Requests run on a worker thread that Wendrel owns, with its own event loop; the process needs a
+// QCoreApplication. Get/Post/... may be called from any thread; they return true once the request
+// is queued, and false only while the client is being destroyed.
+//
+// The reply callback runs on the worker thread, exactly once for every accepted request, with:
+// - the outcome: Qt's mapping of transport failures and HTTP error statuses; TimeoutError when the
+//   deadline passed, UnknownContentError when the body exceeded 8 MiB (the body is then empty),
+//   AuthenticationRequiredError when the credentials were missing or rejected, and
+//   OperationCanceledError when the client was destroyed first;
+// - the response headers as "Name: value" lines, each ended by CR LF;
+// - the body, also for an error status;
+// - whether the request reached the server: it was sent, or an answer came back.
+// A callback may make further requests, and may even destroy its Wendrel: what is still pending
+// is then answered before the destructor returns, and the worker thread is reaped later by the
+// event loop of the thread that created the client.
+//
+// The timeout is a total deadline in milliseconds from the call; 0 means none. Paths and URLs are
+// taken as already percent-encoded. User name and password answer the server's Basic or Digest
+// challenge, once per request, and serve no other request; they never go into the URL or the log.
+// Headers are "Name: value" strings. Only http and https are served; redirects are followed
+// within the same scheme, host and port only, and no cookies are kept.
 #pragma once
 
 #include "ISimpleHTTPClient.h"
@@ -19,9 +37,10 @@
 #define WENDREL_EXPORT __attribute__((visibility("default")))
 #endif
 
+// Certificates are verified against the system's trusted roots by default.
 struct WENDREL_EXPORT WendrelTlsSettings {
-    QString caFile;        // extra PEM certificates to trust
-    bool insecure = false; // skip certificate verification altogether
+    QString caFile;        // extra PEM certificates to trust, such as a camera's self-signed one
+    bool insecure = false; // skip certificate verification altogether (logs one warning)
 
     // WENDREL_CA_FILE and WENDREL_TLS_INSECURE=1.
     static WendrelTlsSettings fromEnvironment();
@@ -29,6 +48,7 @@ struct WENDREL_EXPORT WendrelTlsSettings {
 
 class WENDREL_EXPORT Wendrel : public ISimpleHTTPClient {
 public:
+    // Reads its TLS settings from the environment, once.
     Wendrel();
     explicit Wendrel(const WendrelTlsSettings& tls);
     // Aborts what is in flight, answering each with OperationCanceledError, and stops the worker.
@@ -38,13 +58,13 @@ public:
     Wendrel& operator=(const Wendrel&) = delete;
 
     bool Get(const QString& host, const QString& path, quint16 port, bool useSSL,
-             const QString& user, const QString& password, HttpReplyCallback callback,
-             uint timeout, const QStringList& headers) override;
+             const QString& user, const QString& password, HttpReplyCallback callback, uint timeout,
+             const QStringList& headers) override;
     bool Get(const QString& url, const QString& user, const QString& password,
              HttpReplyCallback callback, uint timeout) override;
     bool Post(const QString& host, const QByteArray& body, const QString& path, quint16 port,
-              bool useSSL, const QString& user, const QString& password,
-              const QString& contentType, HttpReplyCallback callback, uint timeout) override;
+              bool useSSL, const QString& user, const QString& password, const QString& contentType,
+              HttpReplyCallback callback, uint timeout) override;
     bool Post(const QString& url, const QByteArray& body, const QString& user,
               const QString& password, const QString& contentType, HttpReplyCallback callback,
               uint timeout, const QStringList& headers) override;
@@ -56,8 +76,8 @@ public:
                 bool useSSL, const QString& user, const QString& password,
                 const QString& contentType, HttpReplyCallback callback, uint timeout) override;
     bool Put(const QString& host, const QByteArray& body, const QString& path, quint16 port,
-             bool useSSL, const QString& user, const QString& password,
-             const QString& contentType, HttpReplyCallback callback, uint timeout) override;
+             bool useSSL, const QString& user, const QString& password, const QString& contentType,
+             HttpReplyCallback callback, uint timeout) override;
 
 private:
     class WendrelPrivate;

@@ -1,48 +1,167 @@
 #include "Wendrel.h"
 
-WendrelTlsSettings WendrelTlsSettings::fromEnvironment()
-{
-    return {};
+#include "WendrelRequest.h"
+#include "WendrelUrl.h"
+#include "WendrelWorker.h"
+
+#include <QMutex>
+#include <QMutexLocker>
+#include <QThread>
+
+namespace {
+
+WendrelRequest makeRequest(const QByteArray& method, const QUrl& url, const QByteArray& body,
+                           const QString& contentType, const QString& user, const QString& password,
+                           HttpReplyCallback callback, uint timeout) {
+    WendrelRequest request;
+    request.method = method;
+    request.url = url;
+    request.body = body;
+    request.contentType = contentType;
+    request.user = user;
+    request.password = password;
+    request.callback = std::move(callback);
+    if (timeout != 0)
+        request.deadline = WendrelRequest::Clock::now() + std::chrono::milliseconds(timeout);
+    return request;
 }
 
-class Wendrel::WendrelPrivate {};
+// Credentials written into a URL are taken out of it, and used when none were given.
+WendrelRequest fromUrlText(const QByteArray& method, const QString& text, const QByteArray& body,
+                           const QString& contentType, const QString& user, const QString& password,
+                           HttpReplyCallback callback, uint timeout) {
+    QUrl url = WendrelUrl::fromText(text);
+    const bool given = !user.isEmpty() || !password.isEmpty();
+    const QString urlUser = url.userName(QUrl::FullyDecoded);
+    const QString urlPassword = url.password(QUrl::FullyDecoded);
+    url.setUserInfo(QString());
+    return makeRequest(method, url, body, contentType, given ? user : urlUser,
+                       given ? password : urlPassword, std::move(callback), timeout);
+}
 
-Wendrel::Wendrel() = default;
-Wendrel::Wendrel(const WendrelTlsSettings&) {}
+} // namespace
+
+WendrelTlsSettings WendrelTlsSettings::fromEnvironment() {
+    WendrelTlsSettings settings;
+    settings.caFile = qEnvironmentVariable("WENDREL_CA_FILE");
+    settings.insecure = qEnvironmentVariable("WENDREL_TLS_INSECURE") == QLatin1String("1");
+    return settings;
+}
+
+class Wendrel::WendrelPrivate {
+public:
+    explicit WendrelPrivate(const WendrelTlsSettings& tls)
+        : thread(new QThread)
+        , worker(new WendrelWorker(tls)) {
+        thread->setObjectName(QStringLiteral("Wendrel"));
+        worker->moveToThread(thread);
+        // Deferred deletes run as the thread finishes, so the worker dies on its own thread.
+        QObject::connect(thread, &QThread::finished, worker, &QObject::deleteLater);
+        thread->start();
+    }
+
+    ~WendrelPrivate() {
+        {
+            QMutexLocker lock(&mutex);
+            accepting = false;
+        }
+        if (QThread::currentThread() == thread) {
+            // Destroyed from a reply callback: the thread cannot wait for itself, so the
+            // event loop of the thread that created it reaps it.
+            worker->shutdown();
+            QObject::connect(thread, &QThread::finished, thread, &QObject::deleteLater);
+            thread->quit();
+            return;
+        }
+        // Queued behind every request accepted so far.
+        QMetaObject::invokeMethod(
+            worker, [worker = worker] { worker->shutdown(); }, Qt::BlockingQueuedConnection);
+        thread->quit();
+        thread->wait();
+        delete thread;
+    }
+
+    WendrelPrivate(const WendrelPrivate&) = delete;
+    WendrelPrivate& operator=(const WendrelPrivate&) = delete;
+
+    bool submit(WendrelRequest request) {
+        QMutexLocker lock(&mutex);
+        if (!accepting)
+            return false;
+        QMetaObject::invokeMethod(
+            worker,
+            [worker = worker, request = std::move(request)]() mutable {
+                worker->start(std::move(request));
+            },
+            Qt::QueuedConnection);
+        return true;
+    }
+
+private:
+    QMutex mutex;
+    bool accepting = true; // guarded by mutex, so that nothing is queued behind the shutdown
+    QThread* thread;
+    WendrelWorker* worker;
+};
+
+Wendrel::Wendrel()
+    : Wendrel(WendrelTlsSettings::fromEnvironment()) {}
+
+Wendrel::Wendrel(const WendrelTlsSettings& tls)
+    : d(std::make_unique<WendrelPrivate>(tls)) {}
+
 Wendrel::~Wendrel() = default;
 
-bool Wendrel::Get(const QString&, const QString&, quint16, bool, const QString&, const QString&,
-                  HttpReplyCallback, uint, const QStringList&)
-{
-    return false;
+bool Wendrel::Get(const QString& host, const QString& path, quint16 port, bool useSSL,
+                  const QString& user, const QString& password, HttpReplyCallback callback,
+                  uint timeout, const QStringList& headers) {
+    WendrelRequest request = makeRequest("GET", WendrelUrl::fromParts(host, port, useSSL, path), {},
+                                         {}, user, password, std::move(callback), timeout);
+    request.headers = headers;
+    return d->submit(std::move(request));
 }
-bool Wendrel::Get(const QString&, const QString&, const QString&, HttpReplyCallback, uint)
-{
-    return false;
+
+bool Wendrel::Get(const QString& url, const QString& user, const QString& password,
+                  HttpReplyCallback callback, uint timeout) {
+    return d->submit(fromUrlText("GET", url, {}, {}, user, password, std::move(callback), timeout));
 }
-bool Wendrel::Post(const QString&, const QByteArray&, const QString&, quint16, bool,
-                   const QString&, const QString&, const QString&, HttpReplyCallback, uint)
-{
-    return false;
+
+bool Wendrel::Post(const QString& host, const QByteArray& body, const QString& path, quint16 port,
+                   bool useSSL, const QString& user, const QString& password,
+                   const QString& contentType, HttpReplyCallback callback, uint timeout) {
+    return d->submit(makeRequest("POST", WendrelUrl::fromParts(host, port, useSSL, path), body,
+                                 contentType, user, password, std::move(callback), timeout));
 }
-bool Wendrel::Post(const QString&, const QByteArray&, const QString&, const QString&,
-                   const QString&, HttpReplyCallback, uint, const QStringList&)
-{
-    return false;
+
+bool Wendrel::Post(const QString& url, const QByteArray& body, const QString& user,
+                   const QString& password, const QString& contentType, HttpReplyCallback callback,
+                   uint timeout, const QStringList& headers) {
+    WendrelRequest request =
+        fromUrlText("POST", url, body, contentType, user, password, std::move(callback), timeout);
+    request.headers = headers;
+    return d->submit(std::move(request));
 }
-bool Wendrel::PostWithOAuth(const QString&, const QByteArray&, const QString&, quint16, bool,
-                            const QString&, const QString&, const QString&, HttpReplyCallback,
-                            uint)
-{
-    return false;
+
+bool Wendrel::PostWithOAuth(const QString& host, const QByteArray& body, const QString& path,
+                            quint16 port, bool useSSL, const QString&, const QString& password,
+                            const QString& contentType, HttpReplyCallback callback, uint timeout) {
+    WendrelRequest request =
+        makeRequest("POST", WendrelUrl::fromParts(host, port, useSSL, path), body, contentType, {},
+                    password, std::move(callback), timeout);
+    request.bearer = true;
+    return d->submit(std::move(request));
 }
-bool Wendrel::Delete(const QString&, const QByteArray&, const QString&, quint16, bool,
-                     const QString&, const QString&, const QString&, HttpReplyCallback, uint)
-{
-    return false;
+
+bool Wendrel::Delete(const QString& host, const QByteArray& body, const QString& path, quint16 port,
+                     bool useSSL, const QString& user, const QString& password,
+                     const QString& contentType, HttpReplyCallback callback, uint timeout) {
+    return d->submit(makeRequest("DELETE", WendrelUrl::fromParts(host, port, useSSL, path), body,
+                                 contentType, user, password, std::move(callback), timeout));
 }
-bool Wendrel::Put(const QString&, const QByteArray&, const QString&, quint16, bool,
-                  const QString&, const QString&, const QString&, HttpReplyCallback, uint)
-{
-    return false;
+
+bool Wendrel::Put(const QString& host, const QByteArray& body, const QString& path, quint16 port,
+                  bool useSSL, const QString& user, const QString& password,
+                  const QString& contentType, HttpReplyCallback callback, uint timeout) {
+    return d->submit(makeRequest("PUT", WendrelUrl::fromParts(host, port, useSSL, path), body,
+                                 contentType, user, password, std::move(callback), timeout));
 }

@@ -1,0 +1,54 @@
+#include "WendrelUrl.h"
+
+namespace {
+
+bool isHexDigit(QChar c) {
+    return (c >= QLatin1Char('0') && c <= QLatin1Char('9')) ||
+           (c >= QLatin1Char('a') && c <= QLatin1Char('f')) ||
+           (c >= QLatin1Char('A') && c <= QLatin1Char('F'));
+}
+
+// QUrl takes a text with one stray "%" as wholly unencoded and encodes every "%" again; a "#"
+// would start a fragment, which is never sent. Both are escaped here, valid escapes are kept.
+QString escapeStrays(const QString& pathWithQuery) {
+    QString result;
+    result.reserve(pathWithQuery.size());
+    for (qsizetype i = 0; i < pathWithQuery.size(); ++i) {
+        const QChar c = pathWithQuery.at(i);
+        if (c == QLatin1Char('#'))
+            result += QLatin1String("%23");
+        else if (c == QLatin1Char('%') &&
+                 !(i + 2 < pathWithQuery.size() && isHexDigit(pathWithQuery.at(i + 1)) &&
+                   isHexDigit(pathWithQuery.at(i + 2))))
+            result += QLatin1String("%25");
+        else
+            result += c;
+    }
+    return result;
+}
+
+} // namespace
+
+QUrl WendrelUrl::fromParts(const QString& host, quint16 port, bool useSSL,
+                           const QString& pathWithQuery) {
+    QUrl origin;
+    origin.setScheme(useSSL ? QStringLiteral("https") : QStringLiteral("http"));
+    origin.setHost(host);
+    if (port != 0)
+        origin.setPort(port);
+    // The setters for path and query would encode "%" a second time; parsing the whole URL
+    // keeps valid escapes as they are.
+    const QString separator =
+        pathWithQuery.startsWith(QLatin1Char('/')) ? QString() : QStringLiteral("/");
+    return QUrl(origin.toString(QUrl::FullyEncoded) + separator + escapeStrays(pathWithQuery),
+                QUrl::TolerantMode);
+}
+
+QUrl WendrelUrl::fromText(const QString& url) {
+    return QUrl(url, QUrl::TolerantMode);
+}
+
+bool WendrelUrl::isHttp(const QUrl& url) {
+    const QString scheme = url.scheme();
+    return scheme == QLatin1String("http") || scheme == QLatin1String("https");
+}

@@ -1,0 +1,112 @@
+#include "CamsimProcess.h"
+
+#include "BuildPaths.h"
+
+#include <QDeadlineTimer>
+#include <QEventLoop>
+#include <QFile>
+#include <QJsonDocument>
+#include <QNetworkAccessManager>
+#include <QNetworkReply>
+#include <QNetworkRequest>
+#include <QRegularExpression>
+#include <QTimer>
+
+namespace {
+
+const int START_TIMEOUT_MS = 5000;
+const int CONTROL_TIMEOUT_MS = 3000;
+const int POLL_INTERVAL_MS = 10;
+
+QString logPath(const QTemporaryDir& folder) {
+    return folder.filePath(QStringLiteral("requests.log"));
+}
+
+} // namespace
+
+CamsimProcess::CamsimProcess(const QStringList& arguments) {
+    process.setProcessChannelMode(QProcess::ForwardedErrorChannel);
+    process.start(BuildPaths::bin(QStringLiteral("quenvar-camsim")),
+                  QStringList{QStringLiteral("--listen"), host() + QStringLiteral(":0"),
+                              QStringLiteral("--log"), logPath(folder)} +
+                      arguments);
+    const QDeadlineTimer deadline(START_TIMEOUT_MS);
+    while (!process.canReadLine() && !deadline.hasExpired() &&
+           process.state() != QProcess::NotRunning)
+        process.waitForReadyRead(static_cast<int>(deadline.remainingTime()));
+    const QString line = QString::fromUtf8(process.readLine()).trimmed();
+    const QRegularExpressionMatch match =
+        QRegularExpression(QStringLiteral("^listening on https?://[^ ]+:(\\d+)$")).match(line);
+    if (match.hasMatch())
+        listeningPort = match.captured(1).toUShort();
+    else
+        failure = QStringLiteral("quenvar-camsim did not start: \"%1\"").arg(line);
+}
+
+CamsimProcess::~CamsimProcess() {
+    process.kill();
+    process.waitForFinished(START_TIMEOUT_MS);
+}
+
+QStringList CamsimProcess::logLines() const {
+    QFile file(logPath(folder));
+    if (!file.open(QIODevice::ReadOnly))
+        return {};
+    QStringList lines = QString::fromUtf8(file.readAll()).split(QLatin1Char('\n'));
+    lines.removeAll(QString());
+    return lines;
+}
+
+bool CamsimProcess::waitForLogLines(int count, int timeoutMs) const {
+    // The simulator writes from another process: poll, pausing in the event loop between looks.
+    const QDeadlineTimer deadline(timeoutMs);
+    while (logLines().size() < count) {
+        if (deadline.hasExpired())
+            return false;
+        QEventLoop pause;
+        QTimer::singleShot(POLL_INTERVAL_MS, &pause, &QEventLoop::quit);
+        pause.exec();
+    }
+    return true;
+}
+
+QJsonObject CamsimProcess::state() const {
+    return QJsonDocument::fromJson(exchange("GET", QStringLiteral("/_sim/state")).body).object();
+}
+
+bool CamsimProcess::setFault(const QByteArray& form) const {
+    return exchange("POST", QStringLiteral("/_sim/fault"), form,
+                    {{"Content-Type", "application/x-www-form-urlencoded"}})
+               .status == 200;
+}
+
+CamsimProcess::Answer CamsimProcess::exchange(const QByteArray& method, const QString& target,
+                                              const QByteArray& body,
+                                              const Headers& headers) const {
+    QNetworkAccessManager network;
+    QNetworkRequest request(
+        QUrl(QStringLiteral("http://%1:%2%3").arg(host()).arg(listeningPort).arg(target)));
+    for (const auto& header : headers)
+        request.setRawHeader(header.first, header.second);
+    QNetworkReply* reply = network.sendCustomRequest(request, method, body);
+    QEventLoop loop;
+    QObject::connect(reply, &QNetworkReply::finished, &loop, &QEventLoop::quit);
+    QTimer::singleShot(CONTROL_TIMEOUT_MS, &loop, &QEventLoop::quit);
+    loop.exec();
+    Answer answer;
+    if (reply->isFinished()) {
+        answer.status = reply->attribute(QNetworkRequest::HttpStatusCodeAttribute).toInt();
+        answer.headers = reply->rawHeaderPairs();
+        answer.body = reply->readAll();
+    }
+    delete reply;
+    return answer;
+}
+
+QByteArray CamsimProcess::Answer::header(const QByteArray& name) const {
+    for (const auto& entry : headers) {
+        if (entry.first.compare(name, Qt::CaseInsensitive) == 0)
+            return entry.second;
+    }
+    return {};
+}

@@ -1,0 +1,47 @@
+#pragma once
+
+#include "ISimpleHTTPClient.h"
+
+#include <QByteArray>
+#include <QMutex>
+#include <QNetworkReply>
+#include <QThread>
+#include <QWaitCondition>
+
+#include <map>
+#include <memory>
+#include <vector>
+
+// Collects reply callbacks, which arrive on the client's worker thread, per request id.
+class ReplyRecorder {
+public:
+    struct Reply {
+        QNetworkReply::NetworkError error = QNetworkReply::NoError;
+        QByteArray headers;
+        QByteArray body;
+        bool reachedServer = false;
+        QThread* thread = nullptr;
+    };
+
+    ReplyRecorder();
+
+    // The callback holds the recorder's state, not the recorder, so it may outlive it.
+    HttpReplyCallback callback(int id = 0) const;
+    // Waits until callbacks for count distinct ids arrived, or timeoutMs passed.
+    bool waitFor(int count, int timeoutMs = 5000) const;
+    int answered() const;
+    // How often the callback of id was called: exactly once is the contract.
+    int calls(int id = 0) const;
+    Reply reply(int id = 0) const;
+    // Request ids in the order their first callback arrived.
+    std::vector<int> order() const;
+
+private:
+    struct Shared {
+        QMutex mutex;
+        QWaitCondition changed;
+        std::map<int, std::vector<Reply>> replies;
+        std::vector<int> order;
+    };
+    std::shared_ptr<Shared> shared;
+};
