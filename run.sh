@@ -1,10 +1,12 @@
 #!/usr/bin/env bash
-# Set-up, build and run. Usage: ./run.sh test
+# Set-up, build and run. Usage: ./run.sh demo | ./run.sh test
 set -euo pipefail
 cd "$(dirname "$0")"
 
-PACKAGES=(cmake ninja-build g++ pkg-config ccache qt6-base-dev libgtest-dev libgmock-dev
+PACKAGES=(cmake ninja-build g++ pkg-config ccache openssl qt6-base-dev libgtest-dev libgmock-dev
     libcpp-httplib-dev libssl-dev)
+# The demo reads the event stream with curl and formats JSON with jq.
+DEMO_PACKAGES=(curl jq)
 
 as_root() {
     if [ "$(id -u)" -eq 0 ]; then "$@"; else sudo "$@"; fi
@@ -35,13 +37,18 @@ build() {
 
 command=${1:-}
 case "$command" in
+demo)
+    ensure_packages "${PACKAGES[@]}" "${DEMO_PACKAGES[@]}"
+    build build Debug
+    tools/demo/demo.sh build
+    ;;
 test)
     ensure_packages "${PACKAGES[@]}"
     build build Debug
     (cd build && ctest --output-on-failure --timeout 300 -j"$(nproc)")
     ;;
 *)
-    echo "usage: $0 test" >&2
+    echo "usage: $0 demo|test" >&2
     exit 2
     ;;
 esac

@@ -1,0 +1,92 @@
+// quenvar-host: loads the plugins of a folder and serves client requests to PluginQuenvar from
+// the command line (request) or over HTTP (serve).
+#include "CommandLineFront.h"
+#include "HostJson.h"
+#include "HostLog.h"
+#include "HostOptions.h"
+#include "HttpFront.h"
+#include "PluginHost.h"
+#include "QuitOnSignal.h"
+
+#include <QCoreApplication>
+#include <QDir>
+
+#include <csignal>
+#include <cstdio>
+
+namespace {
+
+const QString QUENVAR_PLUGIN_ID = QStringLiteral("4a6c7db2eaf84341b0a1e30507161c73");
+const int EXIT_FAILED = 1;
+const int EXIT_USAGE = 2;
+
+void print(FILE* stream, const QString& text) {
+    const QByteArray bytes = text.toLocal8Bit();
+    std::fwrite(bytes.constData(), 1, static_cast<size_t>(bytes.size()), stream);
+    std::fflush(stream);
+}
+
+int usageError(const QString& message) {
+    print(stderr, QStringLiteral("quenvar-host: %1\n%2").arg(message, HostOptions::usage()));
+    return EXIT_USAGE;
+}
+
+int serve(PluginHost& host, IPluginObjectBase& plugin, const HostOptions& options) {
+    HttpFront front(host, plugin);
+    QString error;
+    if (!front.listen(options.listenHost, options.listenPort, &error)) {
+        HostLog::warning(error);
+        return EXIT_FAILED;
+    }
+    print(stdout,
+          QStringLiteral("listening on http://%1:%2\n").arg(options.listenHost).arg(front.port()));
+    front.start();
+    QuitOnSignal quitOnSignal;
+    QCoreApplication::exec();
+    front.stop();
+    return 0;
+}
+
+} // namespace
+
+int main(int argc, char** argv) {
+    // A client that goes away mid-answer must not end the server.
+    std::signal(SIGPIPE, SIG_IGN);
+    QCoreApplication app(argc, argv);
+
+    HostOptions options;
+    QString error;
+    if (!options.parse(QCoreApplication::arguments().mid(1), &error))
+        return usageError(error);
+    if (options.mode == HostOptions::Mode::Help) {
+        print(stdout, HostOptions::usage());
+        return 0;
+    }
+    QVariant params;
+    if (options.hasParams && !HostJson::parseParameter(options.paramsJson, &params, &error))
+        return usageError(QStringLiteral("PARAMS_JSON is %1").arg(error));
+
+    // The logging library reads its level when first used, which loading the plugins does.
+    if (options.verbose)
+        qputenv("KALBLOG_LEVEL", "5");
+    if (!options.vcaDir.isEmpty())
+        qputenv("VCASIM_DIR", QDir(options.vcaDir).absolutePath().toLocal8Bit());
+    const QString pluginDir = options.pluginDir.isEmpty()
+                                  ? QDir::cleanPath(QCoreApplication::applicationDirPath() +
+                                                    QStringLiteral("/../plugins"))
+                                  : options.pluginDir;
+
+    PluginHost host;
+    host.loadFolder(pluginDir);
+    const LoadedPlugin* quenvar = host.plugin(QUENVAR_PLUGIN_ID);
+    if (!quenvar) {
+        HostLog::warning(QStringLiteral("no PluginQuenvar (PluginID %1) in the plugin folder %2")
+                             .arg(QUENVAR_PLUGIN_ID, pluginDir));
+        return EXIT_USAGE;
+    }
+    host.start();
+
+    if (options.mode == HostOptions::Mode::Serve)
+        return serve(host, *quenvar->object, options);
+    return CommandLineFront(*quenvar->object).run(options.command, params, options.timeoutMs);
+}
