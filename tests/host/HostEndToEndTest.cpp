@@ -1,13 +1,13 @@
 #include "BuildPaths.h"
+#include "EventLoopWait.h"
 #include "ListeningProcess.h"
-#include "PluginTree.h"
-#include "SseClient.h"
 
 #include <QDir>
 #include <QFile>
-#include <QJsonArray>
 #include <QJsonDocument>
 #include <QJsonObject>
+#include <QNetworkAccessManager>
+#include <QNetworkReply>
 #include <QProcess>
 #include <QTemporaryDir>
 
@@ -15,57 +15,41 @@
 #include <httplib.h>
 
 #include <csignal>
+#include <memory>
 
 namespace {
 
 const QString QUENVAR_ID = QStringLiteral("4a6c7db2eaf84341b0a1e30507161c73");
 const QString VCA_ID = QStringLiteral("2F4484ECD91046658F567F2B3B0FDAFD");
-const QString CHANGED_EVENT = QStringLiteral("liveVCARuleChanged");
+const QString EMPTY_XML_RULES =
+    QStringLiteral("<?xml version='1.0' encoding='UTF-8'?><Rules></Rules>");
 
-QString host() {
+QString hostProgram() {
     return BuildPaths::bin(QStringLiteral("quenvar-host"));
 }
 
-QString module(const QString& name) {
-    return BuildPaths::plugins() + QStringLiteral("/lib") + name + QStringLiteral(".so");
-}
-
-QString testModule(const QString& name) {
-    return QStringLiteral(QUENVAR_TEST_PLUGIN_DIR "/lib") + name + QStringLiteral(".so");
-}
-
-struct RequestRun {
+struct HostRun {
     int exitCode = -1;
     QByteArray output;
     QString errors;
-    QJsonObject answer;
 };
 
-RequestRun runRequest(const QStringList& arguments) {
+HostRun runHost(const QStringList& arguments) {
     QProcess process;
-    process.start(host(), QStringList{QStringLiteral("request")} + arguments);
-    RequestRun run;
-    if (!process.waitForFinished(60000) || process.exitStatus() != QProcess::NormalExit)
-        return run;
-    run.exitCode = process.exitCode();
+    process.start(hostProgram(), arguments);
+    HostRun run;
+    if (process.waitForFinished(60000) && process.exitStatus() == QProcess::NormalExit)
+        run.exitCode = process.exitCode();
     run.output = process.readAllStandardOutput();
     run.errors = QString::fromUtf8(process.readAllStandardError());
-    run.answer = QJsonDocument::fromJson(run.output).object();
     return run;
 }
 
-struct HttpReply {
-    int status = 0;
-    QByteArray body;
-};
-
-HttpReply postRequest(quint16 port, const QByteArray& body) {
-    httplib::Client client("127.0.0.1", port);
-    client.set_read_timeout(60, 0);
-    const httplib::Result result =
-        client.Post("/api/request", body.toStdString(), "application/json");
-    return result ? HttpReply{result->status, QByteArray::fromStdString(result->body)}
-                  : HttpReply{};
+// JSON text in one canonical form (compact, keys sorted), so that answers compare as text.
+QString canonical(const QByteArray& json) {
+    const QJsonDocument document = QJsonDocument::fromJson(json);
+    return document.isNull() ? QString::fromUtf8(json.trimmed())
+                             : QString::fromUtf8(document.toJson(QJsonDocument::Compact));
 }
 
 bool writeFile(const QString& path, const QByteArray& content) {
@@ -75,199 +59,320 @@ bool writeFile(const QString& path, const QByteArray& content) {
            file.write(content) == content.size();
 }
 
-QByteArray liveRules(const QByteArray& ruleText) {
-    return "<GetVCARulesRes><Camera><CamName>cam1</CamName><Rules Format=\"json\">"
-           "<Rule Type=\"Intrusion\" Name=\"Front%20door\">" +
+QByteArray liveRules(const QByteArray& camera, const QByteArray& ruleText) {
+    return "<GetVCARulesRes><Camera><CamName>" + camera +
+           "</CamName><Rules Format=\"json\"><Rule Type=\"Intrusion\" Name=\"Front%20door\">" +
            ruleText + "</Rule></Rules></Camera></GetVCARulesRes>";
 }
 
-} // namespace
-
-class HostUnmatchedCommandTest : public ::testing::TestWithParam<const char*> {};
-
-TEST_P(HostUnmatchedCommandTest, PrintsNotAnsweredAndExits3) {
-    const RequestRun run = runRequest({"--timeout-ms", "3000", GetParam(), "{}"});
-    EXPECT_EQ(run.exitCode, 3) << qPrintable(run.errors);
-    EXPECT_EQ(run.output, QByteArray("{\"answered\":false}\n"));
+// The payload of a live rule answer.
+QByteArray livePayload(const QString& camId, bool isJson, const QString& rules,
+                       const QString& relayPath = VCA_ID) {
+    const QJsonObject payload{
+        {"camID", camId}, {"isJSON", isJson}, {"relayPath", relayPath}, {"rules", rules}};
+    return QJsonDocument(payload).toJson(QJsonDocument::Compact);
 }
 
-INSTANTIATE_TEST_SUITE_P(Commands, HostUnmatchedCommandTest,
-                         ::testing::Values("GetVCARules", "AreaZoom", "noSuchCommand"));
+QByteArray liveRequestLine(const QByteArray& camera) {
+    return "GetVCARules\t<GetVCARules><Cam>" + camera + "</Cam></GetVCARules>";
+}
 
-struct UsageCase {
-    QStringList arguments;
-    const char* message;
+// One subscriber's event stream of quenvar-host serve, read as the event loop runs.
+class EventStream {
+public:
+    EventStream(QNetworkAccessManager& network, quint16 port, const QString& subscriberId)
+        : reply(network.get(
+              QNetworkRequest(QUrl(QStringLiteral("http://127.0.0.1:%1/api/events?subscriber=%2")
+                                       .arg(port)
+                                       .arg(subscriberId))))) {}
+
+    // The stream's opening comment arrived: the host has subscribed.
+    bool waitUntilOpen() {
+        return runEventLoopUntil([this]() { return read().contains(": subscribed"); });
+    }
+    bool waitForEvent() {
+        return runEventLoopUntil([this]() { return read().contains("\nevent: "); });
+    }
+
+    // Each event as its name and its data, without the data's time stamp, which must be set.
+    QStringList events() {
+        QStringList events;
+        for (const QString& block : QString::fromUtf8(read()).split("\n\n")) {
+            const QStringList lines = block.split('\n');
+            if (!block.startsWith("event: ") || !lines.value(1).startsWith("data: "))
+                continue;
+            QJsonObject data = QJsonDocument::fromJson(lines[1].mid(6).toUtf8()).object();
+            EXPECT_GT(data.take("timestamp").toDouble(), 0);
+            events << lines[0].mid(7) + " " + QJsonDocument(data).toJson(QJsonDocument::Compact);
+        }
+        return events;
+    }
+
+private:
+    const QByteArray& read() { return text += reply->readAll(); }
+
+    std::unique_ptr<QNetworkReply> reply;
+    QByteArray text;
 };
 
-class HostUsageTest : public ::testing::TestWithParam<UsageCase> {};
-
-TEST_P(HostUsageTest, ExitsWith2AndAMessage) {
-    QProcess process;
-    process.start(host(), GetParam().arguments);
-    ASSERT_TRUE(process.waitForFinished(30000));
-    EXPECT_EQ(process.exitCode(), 2);
-    EXPECT_TRUE(process.readAllStandardOutput().isEmpty());
-    EXPECT_TRUE(process.readAllStandardError().contains(GetParam().message));
+std::string lines(const QStringList& list) {
+    return list.join('\n').toStdString();
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Arguments, HostUsageTest,
-    ::testing::Values(UsageCase{{}, "missing the mode"}, UsageCase{{"run"}, "unknown mode"},
-                      UsageCase{{"request"}, "missing the COMMAND"},
-                      UsageCase{{"request", "areaZoom", "{}", "extra"}, "too many arguments"},
-                      UsageCase{{"request", "areaZoom", "{\"host\":"}, "PARAMS_JSON is not JSON"},
-                      UsageCase{{"request", "retrieveVcaRawRuleInfo", "cam1"}, "PARAMS_JSON"},
-                      UsageCase{{"request", "--timeout-ms", "0", "areaZoom"}, "--timeout-ms"},
-                      UsageCase{{"request", "--listen", "127.0.0.1:0", "areaZoom"}, "--listen"},
-                      UsageCase{{"request", "--bogus", "areaZoom"}, "bogus"},
-                      UsageCase{{"serve", "--listen", "nowhere"}, "--listen"},
-                      UsageCase{{"serve", "areaZoom"}, "serve takes no arguments"}));
-
-TEST(HostPluginFolderTest, FolderWithoutPluginQuenvarExits2) {
-    PluginTree tree;
-    ASSERT_TRUE(tree.isValid());
-    ASSERT_TRUE(tree.add(module("PluginVcaSim")));
-    const RequestRun run = runRequest({"--plugins", tree.plugins(), "areaZoom", "{}"});
-    EXPECT_EQ(run.exitCode, 2);
-    EXPECT_TRUE(run.output.isEmpty());
-    EXPECT_TRUE(run.errors.contains("no PluginQuenvar")) << qPrintable(run.errors);
-}
-
-TEST(HostPluginFolderTest, SkipsBrokenForeignAndIdlessPluginsWithAMessage) {
-    PluginTree tree;
-    ASSERT_TRUE(tree.isValid());
-    ASSERT_TRUE(tree.add(module("PluginQuenvar")));
-    ASSERT_TRUE(tree.add(module("PluginVcaSim")));
-    ASSERT_TRUE(tree.add(module("PluginVcaSim"), "libPluginVcaSimCopy.so"));
-    ASSERT_TRUE(tree.add(testModule("ForeignPlugin")));
-    ASSERT_TRUE(tree.add(testModule("NoIdPlugin")));
-    ASSERT_TRUE(tree.addFile("libBroken.so", "not a shared library"));
-    ASSERT_TRUE(tree.addFile("README.txt", "not a library at all"));
-    QTemporaryDir vca;
-    ASSERT_TRUE(writeFile(QDir(vca.path()).filePath("live/cam1.xml"), liveRules("{}")));
-
-    const RequestRun run = runRequest({"--plugins", tree.plugins(), "--vca-dir", vca.path(),
-                                       "retrieveVcaRawRuleInfo", "\"cam1\""});
-    ASSERT_EQ(run.exitCode, 0) << qPrintable(run.errors);
-    EXPECT_EQ(run.answer.value("payload").toObject().value("relayPath").toString(), VCA_ID);
-    const QStringList skipped = run.errors.split('\n').filter("skipping");
-    EXPECT_EQ(skipped.size(), 4) << qPrintable(run.errors);
-    EXPECT_TRUE(run.errors.contains("skipping libBroken.so: not a Qt plugin"));
-    EXPECT_TRUE(run.errors.contains("skipping libForeignPlugin.so: its interface is "
-                                    "\"org.example.OtherHost.Interface\""));
-    EXPECT_TRUE(run.errors.contains("skipping libNoIdPlugin.so: its metadata has no PluginID"));
-    EXPECT_TRUE(run.errors.contains("skipping libPluginVcaSimCopy.so: PluginID " + VCA_ID +
-                                    " is already loaded from libPluginVcaSim.so"));
-    EXPECT_FALSE(run.errors.contains("README"));
-}
-
-TEST(HostPluginFolderTest, RuleRequestWithoutTheVcaPluginIsAnsweredNoPlugin) {
-    PluginTree tree;
-    ASSERT_TRUE(tree.isValid());
-    ASSERT_TRUE(tree.add(module("PluginQuenvar")));
-    const RequestRun run = runRequest(
-        {"--plugins", tree.plugins(), "--verbose", "retrieveVcaRawRuleInfo", "\"cam1\""});
-    ASSERT_EQ(run.exitCode, 0) << qPrintable(run.errors);
-    EXPECT_EQ(run.answer.value("payload").toObject().value("relayPath").toString(), QString());
-    EXPECT_TRUE(run.errors.contains("GetVCARules from " + QUENVAR_ID + ": no plugin serves it"))
-        << qPrintable(run.errors);
-    EXPECT_TRUE(
-        run.errors.contains("cannot connect vcaMetadataChanged(const QString &) of plugin " +
-                            VCA_ID + ": no plugin with that id"));
-}
-
-// quenvar-host serve with the build's plugins and a VCA data folder with one camera's live rules.
-class HostServeTest : public ::testing::Test {
+class HostEndToEndTest : public ::testing::Test {
 protected:
     static void SetUpTestSuite() { std::signal(SIGPIPE, SIG_IGN); }
-
-    void SetUp() override {
-        ASSERT_TRUE(writeFile(vcaPath("live/cam1.xml"), liveRules("{\"sensitivity\":80}")));
-        ASSERT_TRUE(serve.start(
-            host(), {"serve", "--listen", "127.0.0.1:0", "--verbose", "--vca-dir", vca.path()}))
-            << qPrintable(serve.errorOutput());
-    }
 
     QString vcaPath(const QString& name) const { return QDir(vca.path()).filePath(name); }
 
     QTemporaryDir vca;
-    ListeningProcess serve;
 };
 
-TEST_F(HostServeTest, RejectsBodiesThatAreNotARequest) {
-    for (const QByteArray& body : {QByteArray(), QByteArray("nope"), QByteArray("[]"),
-                                   QByteArray("{}"), QByteArray(R"({"command":7})")}) {
-        const HttpReply reply = postRequest(serve.port(), body);
-        EXPECT_EQ(reply.status, 400) << body.constData();
-        EXPECT_FALSE(reply.body.isEmpty());
-    }
-}
+// Every command through quenvar-host to the simulated camera (Digest authentication) and the
+// simulated VCA plugin, over the command line and over HTTP.
+TEST_F(HostEndToEndTest, AnswersEveryCommandOverBothFronts) {
+    ASSERT_TRUE(writeFile(vcaPath("live/cam1.xml"), liveRules("cam1", "{\"sensitivity\":80}")));
+    ASSERT_TRUE(writeFile(vcaPath("live/cam2.xml"), liveRules("cam2", "{}")));
+    ASSERT_TRUE(writeFile(vcaPath("live/cam2.status"), "80000001"));
+    ASSERT_TRUE(writeFile(vcaPath("live/a&b.xml"), liveRules("a&amp;b", "{}")));
+    ASSERT_TRUE(writeFile(vcaPath("recording/1700000000.xml"),
+                          "<GetRecordingVCARulesRes><Location><LocName>loc-1</LocName>"
+                          "<JsonRules>{\"Intrusion\":{\"Front%20door\":{}}}</JsonRules>"
+                          "<Projection>%7B%22fov%22%3A90%7D</Projection></Location>"
+                          "<Location><LocName>loc-2</LocName><JsonRules/></Location>"
+                          "</GetRecordingVCARulesRes>"));
+    ListeningProcess camera;
+    ASSERT_TRUE(camera.start(BuildPaths::bin("quenvar-camsim"),
+                             {"--listen", "127.0.0.1:0", "--auth", "digest", "--user", "operator",
+                              "--pass", "s3cret pass"}))
+        << qPrintable(camera.errorOutput());
+    ListeningProcess serve;
+    ASSERT_TRUE(
+        serve.start(hostProgram(), {"serve", "--listen", "127.0.0.1:0", "--vca-dir", vca.path()}))
+        << qPrintable(serve.errorOutput());
+    const QByteArray connection = QStringLiteral(R"("host":"127.0.0.1","port":%1,)"
+                                                 R"("user":"operator","pass":"s3cret pass")")
+                                      .arg(camera.port())
+                                      .toUtf8();
 
-TEST_F(HostServeTest, UnmatchedCommandIsNotAnswered) {
-    const HttpReply reply = postRequest(serve.port(), R"({"command":"GetVCARules","params":{}})");
-    EXPECT_EQ(reply.status, 504);
-    EXPECT_EQ(reply.body.trimmed(), QByteArray("{\"answered\":false}"));
-}
+    const QByteArray cam1 =
+        livePayload("cam1", true, R"({"Intrusion":{"Front door":{"sensitivity":80}}})");
+    const QByteArray cam2 = livePayload("cam2", true, R"({"Intrusion":{"Front door":{}}})");
+    const QByteArray ab = livePayload("a&b", true, R"({"Intrusion":{"Front door":{}}})");
+    const QByteArray noRules = livePayload("", false, EMPTY_XML_RULES);
+    const struct {
+        QByteArray command;
+        QByteArray params;
+        QByteArray code;
+        QByteArray payload; // empty: nothing answers
+        QByteArray vcaRequest = {};
+    } rows[] = {
+        {"retrieveVcaRawRuleInfo", R"("cam1")", "0", cam1, liveRequestLine("cam1")},
+        // A failure status of the VCA plugin, and a camera it has no rules for.
+        {"retrieveVcaRawRuleInfo", R"("cam2")", "-1", cam2, liveRequestLine("cam2")},
+        {"retrieveVcaRawRuleInfo", R"("cam9")", "-1", noRules, liveRequestLine("cam9")},
+        // The camera is XML-escaped on the way and decoded by the simulator.
+        {"retrieveVcaRawRuleInfo", R"("a&b")", "0", ab, liveRequestLine("a&amp;b")},
+        // Names that would leave the folder; the log escapes line breaks and backslashes.
+        {"retrieveVcaRawRuleInfo", R"("../recording/1700000000")", "-1", noRules,
+         liveRequestLine("../recording/1700000000")},
+        {"retrieveVcaRawRuleInfo", R"("x\n\\y")", "-1", noRules, liveRequestLine(R"(x\n\\y)")},
+        {"getRecordingVCARule", R"({"locationIDs":["loc-1","loc-2"],"timestamp":1700000000})", "0",
+         R"({"loc-1":{"analysisEngine":"{}","isJSON":true,"projection":"{\"fov\":90}",)"
+         R"("vcaRules":"{\"Intrusion\":{\"Front door\":{}}}"},)"
+         R"("loc-2":{"analysisEngine":"{}","isJSON":true,"projection":"{}","vcaRules":""}})",
+         "GetRecordingVCARules\t<GetRecordingVCARules><QueryTime>1700000000</QueryTime>"
+         "<Loc>loc-1</Loc><Loc>loc-2</Loc></GetRecordingVCARules>"},
+        {"retrievePTZIdleAction", "{CAMERA}", "0", R"({"enabled":"0","interval":"30"})"},
+        {"setPTZIdleAction", R"({CAMERA,"enabled":1,"interval":45})", "0", "null"},
+        {"retrievePTZTrackingType", R"({CAMERA,"nodeID":"node-7"})", "0",
+         R"({"nodeID":"node-7","type":"autotracking"})"},
+        {"setPTZTrackingType", R"({CAMERA,"type":"smarttracking"})", "0", "null"},
+        {"stopPTZMovement", "{CAMERA}", "0", "null"},
+        {"areaZoom",
+         R"({CAMERA,"zoomCenterX":480,"zoomCenterY":270,"viewCellWidth":960,"viewCellHeight":540,)"
+         R"("resolutionWidth":1920,"resolutionHeight":1080,"zoomRatio":2.5})",
+         "0", "null"},
+        {"gotoSmartTrackingAdvPreset", R"({CAMERA,"presetName":"Entrance"})", "0",
+         R"("ptztrack_track='Entrance'\r\n")"},
+        {"getSmartTrackingAdvPresetList", "{CAMERA}", "0", R"(["Entrance","Parking Lot"])"},
+        {"GetVCARules", "{}", {}, {}},
+    };
 
-TEST_F(HostServeTest, ListsTheLoadedPluginsWithTheirMetadata) {
+    QStringList answers;
+    QStringList expected;
+    QByteArray vcaLog;
     httplib::Client client("127.0.0.1", serve.port());
-    const httplib::Result result = client.Get("/api/plugins");
-    ASSERT_TRUE(result);
-    ASSERT_EQ(result->status, 200);
-    QStringList ids;
-    QJsonArray vcaCommands;
-    for (const QJsonValue& entry :
-         QJsonDocument::fromJson(QByteArray::fromStdString(result->body)).array()) {
-        const QJsonObject plugin = entry.toObject();
-        ids.append(plugin.value("pluginId").toString());
-        EXPECT_EQ(plugin.value("metaData").toObject().value("PluginID"), plugin.value("pluginId"));
-        if (plugin.value("pluginId").toString() == VCA_ID)
-            vcaCommands = plugin.value("metaData").toObject().value("Commands").toArray();
+    client.set_read_timeout(60, 0);
+    for (const auto& row : rows) {
+        const QByteArray params = QByteArray(row.params).replace("CAMERA", connection);
+        const HostRun run = runHost(
+            {"request", "--vca-dir", vca.path(), "--timeout-ms", "20000", row.command, params});
+        answers << row.command + " request " + QString::number(run.exitCode) + " " +
+                       canonical(run.output);
+        const QByteArray body = "{\"command\":\"" + row.command + "\",\"params\":" + params + "}";
+        const httplib::Result result =
+            client.Post("/api/request", body.toStdString(), "application/json");
+        answers << row.command + " serve " + QString::number(result ? result->status : 0) + " " +
+                       canonical(result ? QByteArray::fromStdString(result->body) : QByteArray());
+
+        const QString answer =
+            row.payload.isEmpty()
+                ? QStringLiteral("{\"answered\":false}")
+                : canonical("{\"handled\":true,\"code\":\"" + row.code +
+                            "\",\"message\":\"\",\"payload\":" + row.payload + "}");
+        expected << row.command + " request " + (row.payload.isEmpty() ? "3 " : "0 ") + answer
+                 << row.command + " serve " + (row.payload.isEmpty() ? "504 " : "200 ") + answer;
+        if (!row.vcaRequest.isEmpty())
+            vcaLog += row.vcaRequest + '\n' + row.vcaRequest + '\n';
     }
-    EXPECT_EQ(ids, (QStringList{QUENVAR_ID, VCA_ID}));
-    EXPECT_EQ(vcaCommands, (QJsonArray{"GetVCARules", "GetRecordingVCARules"}));
+    EXPECT_EQ(lines(answers), lines(expected));
+
+    QFile logged(vcaPath("requests.log"));
+    ASSERT_TRUE(logged.open(QIODevice::ReadOnly));
+    EXPECT_EQ(logged.readAll().toStdString(), vcaLog.toStdString());
+    // The set commands of both fronts reached the camera: area zoom is relative, 2.5 twice.
+    const httplib::Result state = httplib::Client("127.0.0.1", camera.port()).Get("/_sim/state");
+    ASSERT_TRUE(state);
+    const QJsonObject simState =
+        QJsonDocument::fromJson(QByteArray::fromStdString(state->body)).object();
+    QJsonObject changed;
+    for (const char* key : {"idleInterval", "trackingType", "stopCount", "zoom", "lastPreset"})
+        changed.insert(key, simState.value(key));
+    EXPECT_EQ(canonical(QJsonDocument(changed).toJson()).toStdString(),
+              canonical(R"({"idleInterval":"45","trackingType":"smarttracking","stopCount":2,)"
+                        R"("zoom":6.3,"lastPreset":"Entrance"})")
+                  .toStdString());
 }
 
-TEST_F(HostServeTest, EventStreamNeedsASubscriber) {
+TEST_F(HostEndToEndTest, ServesPluginsAndEventsAndRejectsBadRequests) {
+    ASSERT_TRUE(writeFile(vcaPath("live/cam1.xml"), liveRules("cam1", "{\"sensitivity\":80}")));
+    ListeningProcess serve;
+    ASSERT_TRUE(serve.start(
+        hostProgram(), {"serve", "--listen", "127.0.0.1:0", "--verbose", "--vca-dir", vca.path()}))
+        << qPrintable(serve.errorOutput());
     httplib::Client client("127.0.0.1", serve.port());
-    const httplib::Result result = client.Get("/api/events");
-    ASSERT_TRUE(result);
-    EXPECT_EQ(result->status, 400);
-}
 
-TEST_F(HostServeTest, EventsReachEverySubscriberAndStopForOneThatLeft) {
-    SseClient first(serve.port(), QStringLiteral("A"));
-    SseClient second(serve.port(), QStringLiteral("B"));
+    QStringList statuses;
+    for (const char* body : {"", "nope", "[]", "{}", R"({"command":7})"}) {
+        const httplib::Result result = client.Post("/api/request", body, "application/json");
+        statuses << QString::number(result ? result->status : 0);
+    }
+    const httplib::Result noSubscriber = client.Get("/api/events");
+    statuses << QString::number(noSubscriber ? noSubscriber->status : 0);
+    EXPECT_EQ(lines(statuses), lines(QStringList(6, "400")));
+
+    const httplib::Result plugins = client.Get("/api/plugins");
+    ASSERT_TRUE(plugins);
+    EXPECT_EQ(plugins->status, 200);
+    const QByteArray entries =
+        R"([{"IID":"com.MERIDOX.PluginServer.PluginInterface","className":"PluginQuenvar",)"
+        R"("file":"libPluginQuenvar.so","metaData":{"PluginID":"QUENVAR"},"pluginId":"QUENVAR"},)"
+        R"({"IID":"com.MERIDOX.PluginServer.PluginInterface","className":"PluginVcaSim",)"
+        R"("file":"libPluginVcaSim.so","metaData":{"Commands":["GetVCARules",)"
+        R"("GetRecordingVCARules"],"PluginID":"VCA"},"pluginId":"VCA"}])";
+    EXPECT_EQ(canonical(QByteArray::fromStdString(plugins->body)).toStdString(),
+              canonical(QByteArray(entries)
+                            .replace("QUENVAR", QUENVAR_ID.toUtf8())
+                            .replace("VCA\"", VCA_ID.toUtf8() + '"'))
+                  .toStdString());
+
+    // C leaves before the change, A and B stay for it.
+    QNetworkAccessManager network;
+    {
+        EventStream left(network, serve.port(), "C");
+        ASSERT_TRUE(left.waitUntilOpen());
+    }
+    ASSERT_TRUE(serve.waitForErrorOutput("unsubscribing C"));
+    EventStream first(network, serve.port(), "A");
+    EventStream second(network, serve.port(), "B");
     ASSERT_TRUE(first.waitUntilOpen());
     ASSERT_TRUE(second.waitUntilOpen());
+    ASSERT_TRUE(writeFile(vcaPath("live/cam1.xml"), liveRules("cam1", "{\"sensitivity\":20}")));
+    ASSERT_TRUE(first.waitForEvent());
+    ASSERT_TRUE(second.waitForEvent());
 
-    ASSERT_TRUE(writeFile(vcaPath("live/cam1.xml"), liveRules("{\"sensitivity\":20}")));
-    ASSERT_TRUE(first.waitForEvents(1));
-    ASSERT_TRUE(second.waitForEvents(1));
-    for (const auto& [client, id] : {std::pair{&first, "A"}, std::pair{&second, "B"}}) {
-        const SseClient::Event event = client->events().first();
-        EXPECT_EQ(event.name, CHANGED_EVENT);
-        EXPECT_EQ(event.data.value("eventName").toString(), CHANGED_EVENT);
-        EXPECT_EQ(event.data.value("subscriberId").toString(), QString::fromLatin1(id));
-        EXPECT_EQ(event.data.value("sourcePluginId").toString(), QUENVAR_ID);
-        EXPECT_GT(event.data.value("timestamp").toDouble(), 0);
-        EXPECT_EQ(event.data.value("eventData").toObject().value("rules").toString(),
-                  QStringLiteral(R"({"Intrusion":{"Front door":{"sensitivity":20}}})"));
-    }
-
-    first.close();
-    ASSERT_TRUE(serve.waitForErrorOutput("unsubscribing A"));
-    ASSERT_TRUE(writeFile(vcaPath("live/cam1.xml"), liveRules("{\"sensitivity\":30}")));
-    ASSERT_TRUE(second.waitForEvents(2));
-    EXPECT_EQ(second.events().at(1).data.value("eventData").toObject().value("rules").toString(),
-              QStringLiteral(R"({"Intrusion":{"Front door":{"sensitivity":30}}})"));
-    EXPECT_EQ(first.events().size(), 1);
-    // The plugin no longer emits for A: the host saw one event for it, the first.
-    EXPECT_EQ(serve.errorOutput().count("event liveVCARuleChanged for subscriber A:"), 1);
-}
-
-TEST_F(HostServeTest, StopsCleanlyWhileAStreamIsOpen) {
-    SseClient stream(serve.port(), QStringLiteral("A"));
-    ASSERT_TRUE(stream.waitUntilOpen());
+    const QByteArray rules =
+        livePayload("cam1", true, R"({"Intrusion":{"Front door":{"sensitivity":20}}})");
+    QStringList expected;
+    for (const char* id : {"A", "B"})
+        expected << "liveVCARuleChanged " +
+                        canonical("{\"eventName\":\"liveVCARuleChanged\",\"sourcePluginId\":\"" +
+                                  QUENVAR_ID.toUtf8() + "\",\"subscriberId\":\"" + id +
+                                  "\",\"eventData\":" + rules + "}");
+    EXPECT_EQ(lines(first.events() + second.events()), lines(expected));
+    // The plugin no longer emits for C.
+    EXPECT_FALSE(serve.errorOutput().contains("for subscriber C"))
+        << qPrintable(serve.errorOutput());
     EXPECT_EQ(serve.stop(), 0);
 }
+
+TEST_F(HostEndToEndTest, SkipsPluginsItCannotUseAndAnswersWithoutTheVcaPlugin) {
+    QTemporaryDir tree;
+    const QDir dir(tree.path());
+    ASSERT_TRUE(dir.mkpath("plugins"));
+    // Where the plugins look for the build's shared libraries.
+    ASSERT_TRUE(QFile::link(BuildPaths::lib(), dir.filePath("lib")));
+    const QString plugins = dir.filePath("plugins");
+    const QString quenvar = BuildPaths::plugins() + "/libPluginQuenvar.so";
+    ASSERT_TRUE(QFile::copy(quenvar, plugins + "/libPluginQuenvar.so"));
+    ASSERT_TRUE(QFile::copy(quenvar, plugins + "/libPluginQuenvarCopy.so"));
+    for (const char* name : {"ForeignPlugin", "NoIdPlugin"}) {
+        ASSERT_TRUE(QFile::copy(QStringLiteral(QUENVAR_TEST_PLUGIN_DIR "/lib%1.so").arg(name),
+                                QStringLiteral("%1/lib%2.so").arg(plugins, name)));
+    }
+    ASSERT_TRUE(writeFile(plugins + "/libBroken.so", "not a shared library"));
+    ASSERT_TRUE(writeFile(plugins + "/README.txt", "not a library at all"));
+
+    const HostRun run = runHost(
+        {"request", "--plugins", plugins, "--verbose", "retrieveVcaRawRuleInfo", "\"cam1\""});
+    EXPECT_EQ(run.exitCode, 0);
+    EXPECT_EQ(canonical(run.output).toStdString(),
+              canonical(R"({"handled":false,"code":"-1","message":"","payload":)" +
+                        livePayload("", false, EMPTY_XML_RULES, "") + "}")
+                  .toStdString());
+    QStringList warnings;
+    for (const QString& line : run.errors.split('\n')) {
+        if (line.startsWith("quenvar-host: "))
+            warnings << line.section(" (", 0, 0);
+    }
+    EXPECT_EQ(lines(warnings),
+              lines({"quenvar-host: skipping libBroken.so: not a Qt plugin",
+                     "quenvar-host: skipping libForeignPlugin.so: its interface is "
+                     "\"org.example.OtherHost.Interface\", not "
+                     "\"com.MERIDOX.PluginServer.PluginInterface\"",
+                     "quenvar-host: skipping libNoIdPlugin.so: its metadata has no PluginID",
+                     "quenvar-host: skipping libPluginQuenvarCopy.so: PluginID " + QUENVAR_ID +
+                         " is already loaded from libPluginQuenvar.so",
+                     "quenvar-host: cannot connect vcaMetadataChanged(const QString &) of plugin " +
+                         VCA_ID + ": no plugin with that id"}));
+    EXPECT_TRUE(run.errors.contains("GetVCARules from " + QUENVAR_ID + ": no plugin serves it"))
+        << qPrintable(run.errors);
+}
+
+TEST(HostUsageTest, ExitsWith2AndAMessage) {
+    const struct {
+        QStringList arguments;
+        const char* message;
+    } rows[] = {
+        {{}, "missing the mode"},
+        {{"run"}, "unknown mode"},
+        {{"request"}, "missing the COMMAND"},
+        {{"request", "areaZoom", "{}", "extra"}, "too many arguments"},
+        {{"request", "areaZoom", "{\"host\":"}, "PARAMS_JSON is not JSON"},
+        {{"request", "--timeout-ms", "0", "areaZoom"}, "--timeout-ms"},
+        {{"request", "--listen", "127.0.0.1:0", "areaZoom"}, "--listen"},
+        {{"request", "--bogus", "areaZoom"}, "bogus"},
+        {{"serve", "--listen", "nowhere"}, "--listen"},
+        {{"serve", "areaZoom"}, "serve takes no arguments"},
+        {{"request", "--plugins", QUENVAR_TEST_PLUGIN_DIR, "areaZoom"}, "no PluginQuenvar"},
+    };
+    for (const auto& row : rows) {
+        const HostRun run = runHost(row.arguments);
+        EXPECT_EQ(run.exitCode, 2) << qPrintable(row.arguments.join(' '));
+        EXPECT_TRUE(run.output.isEmpty()) << run.output.constData();
+        EXPECT_TRUE(run.errors.contains(row.message)) << qPrintable(run.errors);
+    }
+}
+
+} // namespace

@@ -1,16 +1,16 @@
 #include "HostRequestChannel.h"
 
+#include "EventLoopWait.h"
 #include "PluginHost.h"
 
 #include <QCoreApplication>
-#include <QDeadlineTimer>
 #include <QJsonArray>
 #include <QJsonObject>
 #include <QThread>
 
 #include <gtest/gtest.h>
 
-#include <mutex>
+#include <memory>
 #include <thread>
 
 namespace {
@@ -18,7 +18,7 @@ namespace {
 const QString TARGET_ID = QStringLiteral("T1");
 const QString SENDER_ID = QStringLiteral("S1");
 
-// The plugin that serves "Answer" at once, keeps the callback of "Hold" and drops "Drop".
+// The plugin that answers "Answer" at once and keeps the callback of "Hold".
 class TargetPlugin : public IPluginObjectBase {
 public:
     void Request(const QString& command, const QVariant& params, const RequestSenderInfo& sender,
@@ -28,7 +28,7 @@ public:
         lastSender = sender.senderId;
         if (command == QStringLiteral("Answer"))
             callback(true, QStringLiteral("0"), QStringLiteral("done"), params);
-        else if (command == QStringLiteral("Hold"))
+        else
             held = callback;
     }
     bool InitialPluginBase(IFrameworkTools*) override { return true; }
@@ -44,68 +44,38 @@ public:
     ResponseCallback held;
 };
 
-struct Reply {
-    bool success = false;
-    QString message;
-    QString relayPath;
-    QString statusCode;
-    QString replyText;
-    bool flag = false;
-};
+using Replies = std::shared_ptr<std::vector<std::string>>;
 
-// Collects the replies of one request, from whichever thread they come.
-class ReplyRecorder {
-public:
-    PluginReplyCallback callback() {
-        return [this](bool success, const QString& message, const QString& relayPath,
-                      const QString& statusCode, const QString& replyText, bool flag) {
-            std::lock_guard<std::mutex> lock(mutex);
-            replies.append(Reply{success, message, relayPath, statusCode, replyText, flag});
-        };
-    }
-    int count() const {
-        std::lock_guard<std::mutex> lock(mutex);
-        return static_cast<int>(replies.size());
-    }
-    Reply first() const {
-        std::lock_guard<std::mutex> lock(mutex);
-        return replies.value(0);
-    }
-
-private:
-    mutable std::mutex mutex;
-    QList<Reply> replies;
-};
-
-bool processEventsUntil(const std::function<bool()>& done, int timeoutMs = 5000) {
-    QDeadlineTimer deadline(timeoutMs);
-    while (!done()) {
-        if (deadline.hasExpired())
-            return false;
-        QCoreApplication::processEvents(QEventLoop::WaitForMoreEvents, 20);
-    }
-    return true;
+// Keeps the replies to one request as text; the host answers in the main thread.
+PluginReplyCallback recordInto(const Replies& replies) {
+    return [replies](bool success, const QString& message, const QString& relayPath,
+                     const QString& statusCode, const QString& replyText, bool flag) {
+        const QStringList fields{
+            success ? "true" : "false", message, relayPath, statusCode, replyText,
+            flag ? "true" : "false"};
+        replies->push_back(fields.join('|').toStdString());
+    };
 }
-
-} // namespace
 
 class HostRequestChannelTest : public ::testing::Test {
 protected:
     void SetUp() override {
         const QJsonObject metaData{
             {"IID", QUENVAR_PLUGIN_INTERFACE_IID},
-            {"MetaData", QJsonObject{{"PluginID", TARGET_ID},
-                                     {"Commands", QJsonArray{"Answer", "Hold", "Drop"}}}}};
+            {"MetaData",
+             QJsonObject{{"PluginID", TARGET_ID}, {"Commands", QJsonArray{"Answer", "Hold"}}}}};
         ASSERT_TRUE(host.addPlugin(&target, metaData, QStringLiteral("in-process")));
     }
 
     // Sends from a record that is gone when SendRequest returns, as a plugin's local would be.
-    void send(const QString& command, int timeoutMs, ReplyRecorder& recorder) {
+    Replies send(const QString& command, int timeoutMs) {
+        const auto replies = std::make_shared<std::vector<std::string>>();
         PluginRequestInfo info;
         info.timeoutMs = timeoutMs;
         info.content = QStringLiteral("<Q>%1</Q>").arg(command);
-        info.callback = recorder.callback();
+        info.callback = recordInto(replies);
         channel.SendRequest(SENDER_ID, channel.GetRequestContext(), 1, command, info);
+        return replies;
     }
 
     TargetPlugin target;
@@ -113,78 +83,40 @@ protected:
     HostRequestChannel channel{host, SENDER_ID};
 };
 
-TEST_F(HostRequestChannelTest, AnswersWithTheServingPluginsAnswerInTheMainThread) {
-    ReplyRecorder recorder;
-    send(QStringLiteral("Answer"), 1000, recorder);
-    EXPECT_EQ(recorder.count(), 0) << "answered from within SendRequest";
+TEST_F(HostRequestChannelTest, AnswersLaterWithTheServingPluginsAnswerOrNoPlugin) {
+    const Replies answered = send(QStringLiteral("Answer"), 1000);
+    const Replies unserved = send(QStringLiteral("GetNothing"), 1000);
+    EXPECT_TRUE(answered->empty() && unserved->empty()) << "answered within SendRequest";
 
-    ASSERT_TRUE(processEventsUntil([&]() { return recorder.count() > 0; }));
-    const Reply reply = recorder.first();
-    EXPECT_TRUE(reply.success);
-    EXPECT_EQ(reply.message, QStringLiteral("done"));
-    EXPECT_EQ(reply.relayPath, TARGET_ID);
-    EXPECT_EQ(reply.statusCode, QStringLiteral("0"));
-    EXPECT_EQ(reply.replyText, QStringLiteral("<Q>Answer</Q>"));
-    EXPECT_TRUE(reply.flag);
+    ASSERT_TRUE(runEventLoopUntil([&]() { return !answered->empty() && !unserved->empty(); }));
+    EXPECT_EQ(*answered, std::vector<std::string>{"true|done|T1|0|<Q>Answer</Q>|true"});
+    EXPECT_EQ(*unserved,
+              std::vector<std::string>{"false|no plugin serves the command||80000404||false"});
     EXPECT_EQ(target.lastParams.userType(), QMetaType::QString);
     EXPECT_EQ(target.lastSender, SENDER_ID);
     EXPECT_EQ(target.requestThread, QCoreApplication::instance()->thread());
 }
 
-TEST_F(HostRequestChannelTest, UnservedCommandIsAnsweredNoPluginLater) {
-    ReplyRecorder recorder;
-    send(QStringLiteral("GetNothing"), 1000, recorder);
-    EXPECT_EQ(recorder.count(), 0);
-
-    ASSERT_TRUE(processEventsUntil([&]() { return recorder.count() > 0; }));
-    const Reply reply = recorder.first();
-    EXPECT_FALSE(reply.success);
-    EXPECT_EQ(reply.message, QStringLiteral("no plugin serves the command"));
-    EXPECT_EQ(reply.relayPath, QString());
-    EXPECT_EQ(reply.statusCode, QStringLiteral("80000404"));
-    EXPECT_EQ(reply.replyText, QString());
-    EXPECT_FALSE(reply.flag);
-}
-
-TEST_F(HostRequestChannelTest, TimeoutAnswersOnceAndDropsTheLateAnswer) {
-    ReplyRecorder recorder;
-    send(QStringLiteral("Hold"), 30, recorder);
-    ASSERT_TRUE(processEventsUntil([&]() { return recorder.count() > 0; }));
-    const Reply reply = recorder.first();
-    EXPECT_FALSE(reply.success);
-    EXPECT_EQ(reply.message, QStringLiteral("timeout"));
-    EXPECT_EQ(reply.statusCode, QStringLiteral("80000102"));
-    EXPECT_FALSE(reply.flag);
-
+TEST_F(HostRequestChannelTest, FirstOfAnswerAndTimeoutIsTheOnlyReply) {
+    // Sent from another thread; the target still runs in the main thread.
+    Replies timedOut;
+    std::thread([&]() { timedOut = send(QStringLiteral("Hold"), 30); }).join();
+    ASSERT_TRUE(runEventLoopUntil([&]() { return !timedOut->empty(); }));
+    EXPECT_EQ(target.requestThread, QCoreApplication::instance()->thread());
     ASSERT_TRUE(target.held);
     target.held(true, QStringLiteral("0"), QString(), QStringLiteral("late"));
-    QCoreApplication::processEvents();
-    EXPECT_EQ(recorder.count(), 1);
-}
+    target.held = nullptr;
 
-TEST_F(HostRequestChannelTest, AnswerBeforeTheTimeoutIsTheOnlyOne) {
-    ReplyRecorder answered;
-    send(QStringLiteral("Hold"), 50, answered);
-    ASSERT_TRUE(processEventsUntil([&]() { return static_cast<bool>(target.held); }));
+    const Replies answered = send(QStringLiteral("Hold"), 50);
+    ASSERT_TRUE(runEventLoopUntil([&]() { return static_cast<bool>(target.held); }));
     target.held(false, QStringLiteral("80000404"), QStringLiteral("none"), QVariant());
     target.held(true, QStringLiteral("0"), QString(), QStringLiteral("again"));
+    // A later request with the same time-out: once it has timed out, so has the one before.
+    const Replies later = send(QStringLiteral("Hold"), 50);
+    ASSERT_TRUE(runEventLoopUntil([&]() { return !later->empty(); }));
 
-    // A later request with the same time-out: once it has timed out, so has the first one.
-    ReplyRecorder later;
-    send(QStringLiteral("Hold"), 50, later);
-    ASSERT_TRUE(processEventsUntil([&]() { return later.count() > 0; }));
-    ASSERT_EQ(answered.count(), 1);
-    EXPECT_TRUE(answered.first().success);
-    EXPECT_EQ(answered.first().statusCode, QStringLiteral("80000404"));
-    EXPECT_EQ(answered.first().message, QStringLiteral("none"));
-    EXPECT_FALSE(answered.first().flag);
+    EXPECT_EQ(*timedOut, std::vector<std::string>{"false|timeout||80000102||false"});
+    EXPECT_EQ(*answered, std::vector<std::string>{"true|none|T1|80000404||false"});
 }
 
-TEST_F(HostRequestChannelTest, RequestsFromAnotherThreadTimeOutToo) {
-    ReplyRecorder recorder;
-    std::thread sender([&]() { send(QStringLiteral("Hold"), 30, recorder); });
-    sender.join();
-    ASSERT_TRUE(processEventsUntil([&]() { return recorder.count() > 0; }));
-    EXPECT_EQ(recorder.first().statusCode, QStringLiteral("80000102"));
-    EXPECT_EQ(target.requestThread, QCoreApplication::instance()->thread());
-}
+} // namespace

@@ -5,7 +5,6 @@
 #include <QDeadlineTimer>
 #include <QEventLoop>
 #include <QFile>
-#include <QJsonDocument>
 #include <QNetworkAccessManager>
 #include <QNetworkReply>
 #include <QNetworkRequest>
@@ -16,11 +15,6 @@ namespace {
 
 const int START_TIMEOUT_MS = 5000;
 const int CONTROL_TIMEOUT_MS = 3000;
-const int POLL_INTERVAL_MS = 10;
-
-QString logPath(const QTemporaryDir& folder) {
-    return folder.filePath(QStringLiteral("requests.log"));
-}
 
 } // namespace
 
@@ -28,7 +22,8 @@ CamsimProcess::CamsimProcess(const QStringList& arguments) {
     process.setProcessChannelMode(QProcess::ForwardedErrorChannel);
     process.start(BuildPaths::bin(QStringLiteral("quenvar-camsim")),
                   QStringList{QStringLiteral("--listen"), host() + QStringLiteral(":0"),
-                              QStringLiteral("--log"), logPath(folder)} +
+                              QStringLiteral("--log"),
+                              folder.filePath(QStringLiteral("requests.log"))} +
                       arguments);
     const QDeadlineTimer deadline(START_TIMEOUT_MS);
     while (!process.canReadLine() && !deadline.hasExpired() &&
@@ -48,30 +43,20 @@ CamsimProcess::~CamsimProcess() {
     process.waitForFinished(START_TIMEOUT_MS);
 }
 
-QStringList CamsimProcess::logLines() const {
-    QFile file(logPath(folder));
-    if (!file.open(QIODevice::ReadOnly))
-        return {};
-    QStringList lines = QString::fromUtf8(file.readAll()).split(QLatin1Char('\n'));
-    lines.removeAll(QString());
+std::vector<std::string> CamsimProcess::logLines() const {
+    QFile file(folder.filePath(QStringLiteral("requests.log")));
+    std::vector<std::string> lines;
+    if (file.open(QIODevice::ReadOnly)) {
+        for (const QByteArray& line : file.readAll().split('\n')) {
+            if (!line.isEmpty())
+                lines.push_back(line.toStdString());
+        }
+    }
     return lines;
 }
 
-bool CamsimProcess::waitForLogLines(int count, int timeoutMs) const {
-    // The simulator writes from another process: poll, pausing in the event loop between looks.
-    const QDeadlineTimer deadline(timeoutMs);
-    while (logLines().size() < count) {
-        if (deadline.hasExpired())
-            return false;
-        QEventLoop pause;
-        QTimer::singleShot(POLL_INTERVAL_MS, &pause, &QEventLoop::quit);
-        pause.exec();
-    }
-    return true;
-}
-
-QJsonObject CamsimProcess::state() const {
-    return QJsonDocument::fromJson(exchange("GET", QStringLiteral("/_sim/state")).body).object();
+std::string CamsimProcess::state() const {
+    return exchange("GET", QStringLiteral("/_sim/state")).body.toStdString();
 }
 
 bool CamsimProcess::setFault(const QByteArray& form) const {
@@ -96,17 +81,9 @@ CamsimProcess::Answer CamsimProcess::exchange(const QByteArray& method, const QS
     Answer answer;
     if (reply->isFinished()) {
         answer.status = reply->attribute(QNetworkRequest::HttpStatusCodeAttribute).toInt();
-        answer.headers = reply->rawHeaderPairs();
+        answer.challenge = reply->rawHeader("WWW-Authenticate");
         answer.body = reply->readAll();
     }
     delete reply;
     return answer;
-}
-
-QByteArray CamsimProcess::Answer::header(const QByteArray& name) const {
-    for (const auto& entry : headers) {
-        if (entry.first.compare(name, Qt::CaseInsensitive) == 0)
-            return entry.second;
-    }
-    return {};
 }

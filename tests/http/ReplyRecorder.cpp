@@ -1,6 +1,7 @@
 #include "ReplyRecorder.h"
 
 #include <QDeadlineTimer>
+#include <QMetaEnum>
 #include <QMutexLocker>
 
 ReplyRecorder::ReplyRecorder()
@@ -28,22 +29,30 @@ bool ReplyRecorder::waitFor(int count, int timeoutMs) const {
     return true;
 }
 
-int ReplyRecorder::answered() const {
+std::map<int, std::string> ReplyRecorder::said(bool details) const {
     QMutexLocker lock(&shared->mutex);
-    return static_cast<int>(shared->replies.size());
+    std::map<int, std::string> said;
+    for (const auto& [id, replies] : shared->replies) {
+        for (const Reply& reply : replies) {
+            std::string& text = said[id];
+            text += std::string(text.empty() ? "" : " | ") +
+                    QMetaEnum::fromType<QNetworkReply::NetworkError>().valueToKey(reply.error);
+            if (!details)
+                continue;
+            text += reply.reachedServer ? " reached" : " unreached";
+            if (reply.body.size() > 256)
+                text += ": " + std::to_string(reply.body.size()) + " bytes";
+            else if (!reply.body.isEmpty())
+                text += ": " + reply.body.toStdString();
+        }
+    }
+    return said;
 }
 
-int ReplyRecorder::calls(int id) const {
+ReplyRecorder::Reply ReplyRecorder::first(int id) const {
     QMutexLocker lock(&shared->mutex);
     const auto found = shared->replies.find(id);
-    return found == shared->replies.end() ? 0 : static_cast<int>(found->second.size());
-}
-
-ReplyRecorder::Reply ReplyRecorder::reply(int id) const {
-    QMutexLocker lock(&shared->mutex);
-    const auto found = shared->replies.find(id);
-    return found == shared->replies.end() || found->second.empty() ? Reply{}
-                                                                   : found->second.front();
+    return found == shared->replies.end() ? Reply{} : found->second.front();
 }
 
 std::vector<int> ReplyRecorder::order() const {

@@ -2,14 +2,13 @@
 
 #include "ISimpleHTTPClient.h"
 
-#include <QByteArray>
 #include <QMutex>
-#include <QNetworkReply>
 #include <QThread>
 #include <QWaitCondition>
 
 #include <map>
 #include <memory>
+#include <string>
 #include <vector>
 
 // Collects reply callbacks, which arrive on the client's worker thread, per request id.
@@ -29,10 +28,11 @@ public:
     HttpReplyCallback callback(int id = 0) const;
     // Waits until callbacks for count distinct ids arrived, or timeoutMs passed.
     bool waitFor(int count, int timeoutMs = 5000) const;
-    int answered() const;
-    // How often the callback of id was called: exactly once is the contract.
-    int calls(int id = 0) const;
-    Reply reply(int id = 0) const;
+    // Per id, every callback as "Error reached: body" (the body's size when it is large), joined
+    // by " | ": exactly one is the contract. Without details, the errors' names alone, for where
+    // timing decides the rest.
+    std::map<int, std::string> said(bool details = true) const;
+    Reply first(int id = 0) const;
     // Request ids in the order their first callback arrived.
     std::vector<int> order() const;
 

@@ -1,3 +1,4 @@
+#include "EventLoopWait.h"
 #include "FakeFrameworkTools.h"
 #include "FakeResponser.h"
 #include "FakeVcaRuleRetriever.h"
@@ -6,14 +7,12 @@
 
 #include <QDateTime>
 #include <QElapsedTimer>
-#include <QEventLoop>
-#include <QTimer>
+#include <QJsonDocument>
+#include <QJsonObject>
 
 #include <gtest/gtest.h>
 
 #include <atomic>
-#include <memory>
-#include <mutex>
 #include <thread>
 
 namespace {
@@ -25,339 +24,196 @@ signals:
     void vcaMetadataChanged(const QString& cameraID);
 };
 
-struct Delivery {
-    bool signalInfo = false;
-    qint64 timestamp = 0;
-    QString eventName;
-    QVariant eventData;
-    QString sourcePluginId;
-    QString subscriberId;
-};
+// The payload of a failed live fetch without text: the empty XML form.
+const QString FAILED_FETCH = R"({"camID":"","isJSON":false,"relayPath":"relay",)"
+                             R"("rules":"<?xml version='1.0' encoding='UTF-8'?><Rules></Rules>"})";
 
-// The host's event emitter: keeps a copy of every record; deliveries may come from any thread.
-class EventRecorder {
-public:
-    EventEmitter emitter() const {
-        return [state = state](PluginObjBase_EventInfoBase* event) {
-            Delivery delivery{false, event->timestamp, event->eventName, event->eventData, {}, {}};
-            if (const auto* info = dynamic_cast<PluginObjBase_EventSignalInfo*>(event)) {
-                delivery.signalInfo = true;
-                delivery.sourcePluginId = info->sourcePluginId;
-                delivery.subscriberId = info->subscriberId;
-            }
-            std::function<void(const Delivery&)> hook;
-            {
-                std::lock_guard<std::mutex> lock(state->mutex);
-                state->deliveries.append(delivery);
-                hook = state->hook;
-            }
-            if (hook)
-                hook(delivery);
-        };
-    }
-
-    QList<Delivery> deliveries() const {
-        std::lock_guard<std::mutex> lock(state->mutex);
-        return state->deliveries;
-    }
-
-    QStringList subscriberIds() const {
-        QStringList ids;
-        for (const Delivery& delivery : deliveries())
-            ids << delivery.subscriberId;
-        return ids;
-    }
-
-    // Runs after each record is kept, on the delivering thread.
-    void setHook(std::function<void(const Delivery&)> hook) {
-        std::lock_guard<std::mutex> lock(state->mutex);
-        state->hook = std::move(hook);
-    }
-
-private:
-    struct State {
-        std::mutex mutex;
-        QList<Delivery> deliveries;
-        std::function<void(const Delivery&)> hook;
-    };
-    std::shared_ptr<State> state = std::make_shared<State>();
-};
-
-QVariant rulesPayload(const QString& cameraId) {
-    return QVariantMap{{"camID", cameraId},
-                       {"relayPath", "/relay/1"},
-                       {"isJSON", true},
-                       {"rules", "[{\"name\":\"line\"}]"}};
+std::string joined(const QStringList& lines) {
+    return lines.join('\n').toStdString();
 }
 
-// Runs the event loop until done() holds or clock reaches deadlineMs; returns done().
-bool runEventLoopUntil(const QElapsedTimer& clock, qint64 deadlineMs,
-                       const std::function<bool()>& done) {
-    QEventLoop loop;
-    QTimer poll;
-    QObject::connect(&poll, &QTimer::timeout, &loop, [&]() {
-        if (done() || clock.elapsed() >= deadlineMs)
-            loop.quit();
-    });
-    poll.start(10);
-    if (!done() && clock.elapsed() < deadlineMs)
-        loop.exec();
-    return done();
-}
-
+// The plugin with its own rule service, which fetches through the fake request channel.
 class EventsTest : public ::testing::Test {
 protected:
     void SetUp() override {
-        tools.emitter = recorder.emitter();
-        ASSERT_TRUE(plugin.InitialPluginBase(&tools));
-        plugin.setVcaRuleRetriever(rules);
+        tools.emitter = [this](PluginObjBase_EventInfoBase* event) {
+            const auto* info = dynamic_cast<PluginObjBase_EventSignalInfo*>(event);
+            ASSERT_NE(info, nullptr);
+            const QJsonObject data = QJsonObject::fromVariantMap(info->eventData.toMap());
+            delivered << QStringList{info->subscriberId, info->eventName, info->sourcePluginId,
+                                     QJsonDocument(data).toJson(QJsonDocument::Compact)}
+                             .join(' ');
+            timestamps << info->timestamp;
+            if (onDelivery)
+                onDelivery(info->subscriberId, info->timestamp);
+        };
+        ASSERT_TRUE(plugin->InitialPluginBase(&tools));
     }
 
     void TearDown() override { EXPECT_EQ(responser.count, 0); }
 
     void subscribe(const QString& id, const QString& eventName = EVENT_LIVE_VCA_RULE_CHANGED) {
-        plugin.SubscribeEventBlock(id, eventName, QVariant(), RequestSenderInfo{}, responser);
+        plugin->SubscribeEventBlock(id, eventName, QVariant(), RequestSenderInfo{}, responser);
     }
 
-    void unsubscribe(const QString& id) { plugin.UnsubscribeEventBlock(id, QVariant(), responser); }
+    void unsubscribe(const QString& id) {
+        plugin->UnsubscribeEventBlock(id, QVariant(), responser);
+    }
 
-    // One fetch, answered with payload.
-    void deliver(const QVariant& payload, bool ok = true) {
-        plugin.handleVCAMetadataChanged(QStringLiteral("cam-1"));
-        ASSERT_FALSE(rules->liveCalls.isEmpty());
-        rules->liveCalls.last().callback(ok, ok ? "0" : "-1", "", payload);
+    // A change of cam-1 whose fetch fails without text.
+    void change() {
+        plugin->handleVCAMetadataChanged(QStringLiteral("cam-1"));
+        tools.channel.reply(tools.channel.count() - 1, false, "", "relay", "80000404", "", true);
+    }
+
+    static QStringList expected(const QStringList& ids) {
+        QStringList lines;
+        for (const QString& id : ids)
+            lines << id + " liveVCARuleChanged " + PLUGIN_ID + " " + FAILED_FETCH;
+        return lines;
     }
 
     FakeFrameworkTools tools;
-    EventRecorder recorder;
     FakeResponser responser;
-    PluginQuenvar plugin;
-    std::shared_ptr<FakeVcaRuleRetriever> rules = std::make_shared<FakeVcaRuleRetriever>();
+    QStringList delivered;
+    QList<qint64> timestamps;
+    std::function<void(const QString&, qint64)> onDelivery;
+    std::unique_ptr<PluginQuenvar> plugin = std::make_unique<PluginQuenvar>();
 };
 
-TEST_F(EventsTest, DeliversOneRecordPerSubscriptionInOrder) {
+TEST_F(EventsTest, OneRecordPerSubscriptionInOrderEvenForAFailedFetch) {
     // Holding each record until the clock moves on shows whether each gets its own time.
-    recorder.setHook([](const Delivery& delivery) {
+    onDelivery = [](const QString&, qint64 timestamp) {
         QElapsedTimer guard;
         guard.start();
-        while (QDateTime::currentMSecsSinceEpoch() <= delivery.timestamp && guard.elapsed() < 100)
+        while (QDateTime::currentMSecsSinceEpoch() <= timestamp && guard.elapsed() < 100)
             ;
-    });
+    };
     subscribe("A");
     subscribe("A");
     subscribe("B", "someOtherEvent");
     subscribe("C");
-
     const qint64 before = QDateTime::currentMSecsSinceEpoch();
-    deliver(rulesPayload("cam-1"));
-    const qint64 after = QDateTime::currentMSecsSinceEpoch();
+    change();
 
-    ASSERT_EQ(rules->liveCalls.size(), 1);
-    EXPECT_EQ(rules->liveCalls[0].cameraId, "cam-1");
-    const QList<Delivery> deliveries = recorder.deliveries();
-    EXPECT_EQ(recorder.subscriberIds(), (QStringList{"A", "A", "B", "C"}));
-    qint64 previous = before - 1;
-    for (const Delivery& delivery : deliveries) {
-        SCOPED_TRACE(qPrintable(delivery.subscriberId));
-        EXPECT_TRUE(delivery.signalInfo);
-        EXPECT_EQ(delivery.eventName, "liveVCARuleChanged");
-        EXPECT_EQ(delivery.sourcePluginId, PLUGIN_ID);
-        EXPECT_EQ(delivery.eventData, rulesPayload("cam-1"));
-        EXPECT_GT(delivery.timestamp, previous);
-        EXPECT_LE(delivery.timestamp, after);
-        previous = delivery.timestamp;
-    }
+    EXPECT_EQ(tools.channel.sent().value(0).info.content,
+              "<GetVCARules><Cam>cam-1</Cam></GetVCARules>");
+    EXPECT_EQ(joined(delivered), joined(expected({"A", "A", "B", "C"})));
+    ASSERT_EQ(timestamps.size(), 4);
+    EXPECT_GE(timestamps[0], before);
+    for (int i = 1; i < timestamps.size(); ++i)
+        EXPECT_GT(timestamps[i], timestamps[i - 1]);
 }
 
-TEST_F(EventsTest, FailedFetchIsStillDelivered) {
-    subscribe("A");
-    deliver(QVariant(), false);
-    ASSERT_EQ(recorder.deliveries().size(), 1);
-    EXPECT_FALSE(recorder.deliveries()[0].eventData.isValid());
-}
-
-TEST_F(EventsTest, UnsubscribeRemovesEveryEntryOfExactlyThatId) {
-    subscribe("A");
-    subscribe("B");
-    subscribe("A");
-    subscribe("C");
-    unsubscribe("A");
-    unsubscribe("a");
-    unsubscribe("Z");
-    deliver(rulesPayload("cam-1"));
-    EXPECT_EQ(recorder.subscriberIds(), (QStringList{"B", "C"}));
-
-    unsubscribe("B");
-    unsubscribe("C");
-    deliver(rulesPayload("cam-1"));
-    EXPECT_EQ(rules->liveCalls.size(), 2);
-    EXPECT_EQ(recorder.deliveries().size(), 2);
-}
-
-TEST_F(EventsTest, SubscriptionChangesDuringADeliveryApplyFromTheNextOne) {
-    // Each subscriber leaves on receipt; A's receipt brings in D.
-    recorder.setHook([this](const Delivery& delivery) {
-        unsubscribe(delivery.subscriberId);
-        if (delivery.subscriberId == "A")
+TEST_F(EventsTest, UnsubscribeRemovesEveryEntryAndChangesDuringADeliveryApplyAfterIt) {
+    for (const char* id : {"A", "B", "A", "C"})
+        subscribe(id);
+    for (const char* id : {"A", "a", "Z"})
+        unsubscribe(id);
+    // Each subscriber leaves on receipt; B's receipt brings in D.
+    onDelivery = [this](const QString& id, qint64) {
+        unsubscribe(id);
+        if (id == "B")
             subscribe("D");
-    });
-    subscribe("A");
-    subscribe("B");
-    subscribe("C");
-
-    deliver(rulesPayload("cam-1"));
-    EXPECT_EQ(recorder.subscriberIds(), (QStringList{"A", "B", "C"}));
-    deliver(rulesPayload("cam-1"));
-    EXPECT_EQ(recorder.subscriberIds(), (QStringList{"A", "B", "C", "D"}));
-    deliver(rulesPayload("cam-1"));
-    EXPECT_EQ(recorder.deliveries().size(), 4);
+    };
+    change();
+    change();
+    change();
+    EXPECT_EQ(tools.channel.count(), 3);
+    EXPECT_EQ(joined(delivered), joined(expected({"B", "C", "D"})));
 }
 
-TEST_F(EventsTest, ConcurrentSubscriptionsDuringDeliveriesKeepEveryEntry) {
-    const int count = 2000;
-    plugin.handleVCAMetadataChanged(QStringLiteral("cam-1"));
+TEST_F(EventsTest, NothingIsDeliveredBeforeInitialisationOrAfterDestruction) {
+    PluginQuenvar early;
+    const auto rules = std::make_shared<FakeVcaRuleRetriever>();
+    early.setVcaRuleRetriever(rules);
+    early.SubscribeEventBlock("A", EVENT_LIVE_VCA_RULE_CHANGED, {}, {}, responser);
+    early.handleVCAMetadataChanged("cam-1");
     ASSERT_EQ(rules->liveCalls.size(), 1);
-    const ResponseCallback answer = rules->liveCalls[0].callback;
-    // The stress run's records are counted, not kept.
-    std::atomic<int> delivered{0};
-    tools.emitter = [&delivered](PluginObjBase_EventInfoBase*) { ++delivered; };
-    ASSERT_TRUE(plugin.InitialPluginBase(&tools));
+    EXPECT_NO_THROW(rules->liveCalls[0].callback(true, "0", "", QVariant()));
+    subscribe("B");
+    plugin->handleVCAMetadataChanged("cam-1");
+    plugin.reset();
+    tools.channel.reply(0, false, "", "relay", "80000404", "", true);
+    EXPECT_TRUE(delivered.isEmpty());
 
+    ASSERT_TRUE(early.InitialPluginBase(&tools));
+    early.handleVCAMetadataChanged("cam-1");
+    tools.channel.reply(1, false, "", "relay", "80000404", "", true);
+    EXPECT_EQ(joined(delivered), joined(expected({"A"})));
+}
+
+TEST(EventsStressTest, SubscriptionsFromOtherThreadsDuringDeliveriesAreAllKept) {
+    FakeFrameworkTools tools;
+    std::atomic<int> deliveries{0};
+    tools.emitter = [&deliveries](PluginObjBase_EventInfoBase*) { ++deliveries; };
+    PluginQuenvar plugin;
+    ASSERT_TRUE(plugin.InitialPluginBase(&tools));
+    // One fetch, whose answer is delivered over and over.
+    plugin.handleVCAMetadataChanged("cam-1");
+
+    const int count = 2000;
     std::atomic<int> writersLeft{2};
     std::thread deliverer([&]() {
         for (int round = 0; writersLeft > 0 || round < 3; ++round)
-            answer(true, "0", "", QVariant(round));
+            tools.channel.reply(0, true, "", "relay", "0", "", true);
     });
-    std::thread first([&]() {
-        FakeResponser own;
-        for (int i = 0; i < count; ++i)
-            plugin.SubscribeEventBlock(QString("x%1").arg(i), EVENT_LIVE_VCA_RULE_CHANGED,
-                                       QVariant(), RequestSenderInfo{}, own);
-        --writersLeft;
-    });
-    std::thread second([&]() {
+    const auto writer = [&](const QString& prefix) {
         FakeResponser own;
         for (int i = 0; i < count; ++i) {
-            plugin.SubscribeEventBlock(QString("y%1").arg(i), EVENT_LIVE_VCA_RULE_CHANGED,
-                                       QVariant(), RequestSenderInfo{}, own);
-            plugin.SubscribeEventBlock("passing", EVENT_LIVE_VCA_RULE_CHANGED, QVariant(),
-                                       RequestSenderInfo{}, own);
-            plugin.UnsubscribeEventBlock("passing", QVariant(), own);
+            plugin.SubscribeEventBlock(prefix + QString::number(i), EVENT_LIVE_VCA_RULE_CHANGED, {},
+                                       {}, own);
+            plugin.SubscribeEventBlock("passing", EVENT_LIVE_VCA_RULE_CHANGED, {}, {}, own);
+            plugin.UnsubscribeEventBlock("passing", {}, own);
         }
         --writersLeft;
-    });
+    };
+    std::thread first(writer, QStringLiteral("x"));
+    std::thread second(writer, QStringLiteral("y"));
     first.join();
     second.join();
     deliverer.join();
-    EXPECT_GT(delivered, 0);
+    EXPECT_GT(deliveries, 0);
 
-    tools.emitter = recorder.emitter();
+    QStringList byWriter[2];
+    tools.emitter = [&byWriter](PluginObjBase_EventInfoBase* event) {
+        const QString id = static_cast<PluginObjBase_EventSignalInfo*>(event)->subscriberId;
+        byWriter[id.startsWith('y')] << id;
+    };
     ASSERT_TRUE(plugin.InitialPluginBase(&tools));
-    answer(true, "0", "", QVariant());
-    QStringList xs;
-    QStringList ys;
-    for (const QString& id : recorder.subscriberIds())
-        (id.startsWith('x') ? xs : ys) << id;
-    ASSERT_EQ(xs.size(), count);
-    ASSERT_EQ(ys.size(), count);
-    for (int i = 0; i < count; ++i) {
-        ASSERT_EQ(xs[i], QString("x%1").arg(i));
-        ASSERT_EQ(ys[i], QString("y%1").arg(i));
+    tools.channel.reply(0, true, "", "relay", "0", "", true);
+    for (int w = 0; w < 2; ++w) {
+        ASSERT_EQ(byWriter[w].size(), count);
+        for (int i = 0; i < count; ++i)
+            ASSERT_EQ(byWriter[w][i], QString("xy"[w]) + QString::number(i));
     }
 }
 
-TEST_F(EventsTest, SecondInitialisationSendsEventsThroughTheNewEmitter) {
-    FakeFrameworkTools second;
-    EventRecorder secondRecorder;
-    second.emitter = secondRecorder.emitter();
-    subscribe("A");
-    ASSERT_TRUE(plugin.InitialPluginBase(&second));
-    plugin.setVcaRuleRetriever(rules);
-
-    deliver(rulesPayload("cam-1"));
-    EXPECT_TRUE(recorder.deliveries().isEmpty());
-    EXPECT_EQ(secondRecorder.subscriberIds(), QStringList{"A"});
-}
-
-TEST(EventsLifetimeTest, DeliveryBeforeInitialisationDeliversNothing) {
-    FakeFrameworkTools tools;
-    EventRecorder recorder;
-    tools.emitter = recorder.emitter();
-    FakeResponser responser;
-    const auto rules = std::make_shared<FakeVcaRuleRetriever>();
-    PluginQuenvar plugin;
-    plugin.setVcaRuleRetriever(rules);
-    plugin.SubscribeEventBlock("A", EVENT_LIVE_VCA_RULE_CHANGED, QVariant(), RequestSenderInfo{},
-                               responser);
-
-    plugin.handleVCAMetadataChanged("cam-1");
-    ASSERT_EQ(rules->liveCalls.size(), 1);
-    EXPECT_NO_THROW(rules->liveCalls[0].callback(true, "0", "", rulesPayload("cam-1")));
-
-    ASSERT_TRUE(plugin.InitialPluginBase(&tools));
-    plugin.setVcaRuleRetriever(rules);
-    plugin.handleVCAMetadataChanged("cam-1");
-    ASSERT_EQ(rules->liveCalls.size(), 2);
-    rules->liveCalls[1].callback(true, "0", "", rulesPayload("cam-1"));
-    EXPECT_EQ(recorder.subscriberIds(), QStringList{"A"});
-}
-
-TEST(EventsLifetimeTest, AnswerAfterDestructionDeliversNothing) {
-    FakeFrameworkTools tools;
-    EventRecorder recorder;
-    tools.emitter = recorder.emitter();
-    FakeResponser responser;
-    const auto rules = std::make_shared<FakeVcaRuleRetriever>();
-    auto plugin = std::make_unique<PluginQuenvar>();
-    ASSERT_TRUE(plugin->InitialPluginBase(&tools));
-    plugin->setVcaRuleRetriever(rules);
-    plugin->SubscribeEventBlock("A", EVENT_LIVE_VCA_RULE_CHANGED, QVariant(), RequestSenderInfo{},
-                                responser);
-    plugin->handleVCAMetadataChanged("cam-1");
-    ASSERT_EQ(rules->liveCalls.size(), 1);
-
-    plugin.reset();
-    rules->liveCalls[0].callback(true, "0", "", rulesPayload("cam-1"));
-    EXPECT_TRUE(recorder.deliveries().isEmpty());
-}
-
-// A plugin connected to a stand-in VCA plugin, with its own tools and rule service.
+// A plugin connected to a stand-in VCA plugin, with subscribers, recording whom it delivers to.
 struct Rig {
-    Rig() {
-        tools.emitter = recorder.emitter();
+    explicit Rig(const QStringList& subscribers) {
+        tools.emitter = [this](PluginObjBase_EventInfoBase* event) {
+            delivered << static_cast<PluginObjBase_EventSignalInfo*>(event)->subscriberId;
+        };
         tools.registerPlugin(VCA_PLUGIN_ID, &vca);
         plugin->InitialPluginBase(&tools);
-        plugin->setVcaRuleRetriever(rules);
         plugin->AllPluginLoaded();
-    }
-
-    void subscribe(const QString& id) {
-        plugin->SubscribeEventBlock(id, EVENT_LIVE_VCA_RULE_CHANGED, QVariant(),
-                                    RequestSenderInfo{}, responser);
-    }
-
-    void answerAll() {
-        for (const auto& call : rules->liveCalls)
-            call.callback(true, "0", "", rulesPayload(call.cameraId));
+        for (const QString& id : subscribers)
+            plugin->SubscribeEventBlock(id, EVENT_LIVE_VCA_RULE_CHANGED, {}, {}, responser);
     }
 
     FakeFrameworkTools tools;
-    EventRecorder recorder;
-    FakeResponser responser;
     VcaPluginStandIn vca;
-    std::shared_ptr<FakeVcaRuleRetriever> rules = std::make_shared<FakeVcaRuleRetriever>();
+    FakeResponser responser;
+    QStringList delivered;
     std::unique_ptr<PluginQuenvar> plugin = std::make_unique<PluginQuenvar>();
 };
 
-// The three cases share one wait for the delay to pass.
-TEST(EventsDelayTest, ChangeSignalFetchesOnceAfterTheDelayPerSignal) {
-    Rig lonely;
-    Rig busy;
-    busy.subscribe("A");
-    busy.subscribe("B");
-    Rig gone;
-    gone.subscribe("A");
-
+// The cases share one wait for the delay to pass.
+TEST(EventsDelayTest, EachChangeSignalFetchesOnceTwoSecondsLater) {
+    Rig lonely({});
+    Rig busy({"A", "B"});
+    Rig gone({"A"});
     QElapsedTimer clock;
     clock.start();
     emit lonely.vca.vcaMetadataChanged("cam-1");
@@ -367,29 +223,33 @@ TEST(EventsDelayTest, ChangeSignalFetchesOnceAfterTheDelayPerSignal) {
     gone.plugin.reset();
 
     const auto fetched = [&]() {
-        return lonely.rules->liveCalls.size() + busy.rules->liveCalls.size() +
-               gone.rules->liveCalls.size();
+        return lonely.tools.channel.count() + busy.tools.channel.count();
     };
-    EXPECT_FALSE(runEventLoopUntil(clock, 1500, [&]() { return fetched() > 0; }))
+    EXPECT_FALSE(runEventLoopUntil([&]() { return fetched() > 0; }, 1500))
         << "fetched after " << clock.elapsed() << " ms";
-    EXPECT_TRUE(runEventLoopUntil(clock, 5000, [&]() {
-        return lonely.rules->liveCalls.size() == 1 && busy.rules->liveCalls.size() == 3;
-    }));
+    EXPECT_TRUE(runEventLoopUntil([&]() { return fetched() == 4; }, 5000 - clock.elapsed()));
     // Past the destroyed plugin's timer too, coarse timers included.
-    runEventLoopUntil(clock, 2300, []() { return false; });
+    runEventLoopUntil([]() { return false; }, 2300 - clock.elapsed());
+    EXPECT_EQ(gone.tools.channel.count(), 0);
+    EXPECT_EQ(lonely.tools.channel.count(), 1);
+    EXPECT_EQ(busy.tools.channel.count(), 3);
+    EXPECT_EQ(lonely.tools.channel.sent().value(0).info.content,
+              "<GetVCARules><Cam>cam-1</Cam></GetVCARules>");
+    // AllPluginLoaded connected the signal with the encoded names a host expects.
+    const FakeFrameworkTools::Connection connection = lonely.tools.connections.value(0);
+    EXPECT_EQ(lonely.tools.connections.size(), 1);
+    EXPECT_EQ(connection.pluginId, VCA_PLUGIN_ID);
+    EXPECT_EQ(connection.signal, "2vcaMetadataChanged(const QString &)");
+    EXPECT_EQ(connection.receiver, lonely.plugin.get());
+    EXPECT_EQ(connection.method, "1vcaMetadataChanged(const QString &)");
+    EXPECT_EQ(connection.connectionType, static_cast<int>(Qt::AutoConnection));
 
-    EXPECT_EQ(lonely.rules->liveCalls.size(), 1);
-    EXPECT_EQ(lonely.rules->liveCalls.value(0).cameraId, "cam-1");
-    EXPECT_EQ(busy.rules->liveCalls.size(), 3);
-    EXPECT_EQ(gone.rules->liveCalls.size(), 0);
-
-    lonely.answerAll();
-    busy.answerAll();
-    EXPECT_TRUE(lonely.recorder.deliveries().isEmpty());
-    EXPECT_EQ(busy.recorder.subscriberIds(), (QStringList{"A", "B", "A", "B", "A", "B"}));
-    for (const Delivery& delivery : busy.recorder.deliveries())
-        EXPECT_EQ(delivery.eventData, rulesPayload("cam-2"));
-    EXPECT_TRUE(gone.recorder.deliveries().isEmpty());
+    for (Rig* rig : {&lonely, &busy}) {
+        for (int i = 0; i < rig->tools.channel.count(); ++i)
+            rig->tools.channel.reply(i, true, "", "relay", "0", "", true);
+    }
+    EXPECT_TRUE(lonely.delivered.isEmpty());
+    EXPECT_EQ(busy.delivered, (QStringList{"A", "B", "A", "B", "A", "B"}));
 }
 
 } // namespace

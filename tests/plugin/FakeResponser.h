@@ -5,8 +5,7 @@
 // Counts the answers of the blocking operations; the plugin is expected to give none.
 class FakeResponser : public IResponser {
 public:
-    void Respond(bool handled, const QString& code, const QString& message,
-                 const QVariant& payload) override;
+    void Respond(bool, const QString&, const QString&, const QVariant&) override { ++count; }
 
     int count = 0;
 };

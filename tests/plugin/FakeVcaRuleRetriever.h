@@ -18,9 +18,13 @@ public:
         ResponseCallback callback;
     };
 
-    void getLiveVcaRule(const QString& cameraId, ResponseCallback callback) override;
+    void getLiveVcaRule(const QString& cameraId, ResponseCallback callback) override {
+        liveCalls.append({cameraId, std::move(callback)});
+    }
     void getRecordingVcaRule(const QList<QString>& locationIDs, quint64 timestamp,
-                             ResponseCallback callback) override;
+                             ResponseCallback callback) override {
+        recordingCalls.append({locationIDs, timestamp, std::move(callback)});
+    }
 
     QList<LiveCall> liveCalls;
     QList<RecordingCall> recordingCalls;

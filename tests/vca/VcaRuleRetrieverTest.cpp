@@ -1,159 +1,201 @@
 #include "QUILImplementation/VcaRuleRetriever.h"
 
 #include "FakeFrameworkTools.h"
-#include "RecordedAnswer.h"
+#include "PluginQuenvarDefs.h"
+#include "ResponseRecorder.h"
 
 #include <gtest/gtest.h>
 
 namespace {
 
-const QString PLUGIN_ID = QStringLiteral("4a6c7db2eaf84341b0a1e30507161c73");
-const QString EMPTY_XML_RULES =
-    QStringLiteral("<?xml version='1.0' encoding='UTF-8'?><Rules></Rules>");
+using Response = ResponseRecorder::Response;
+
+const QString LIVE_REPLY =
+    QStringLiteral("<GetVCARulesRes><Camera><CamName>c</CamName><Rules Format=\"json\">"
+                   "<Rule Type=\"A\" Name=\"r\">1</Rule></Rules></Camera></GetVCARulesRes>");
+const QVariantMap LIVE_RESULT{
+    {"camID", "c"}, {"relayPath", "relay"}, {"isJSON", true}, {"rules", R"({"A":{"r":1}})"}};
+
+QString recordingReply(const QString& locations) {
+    return "<?xml version=\"1.0\"?>\n<GetRecordingVCARulesRes>\n" + locations +
+           "</GetRecordingVCARulesRes>\n";
+}
+
+QVariantMap entry(const QString& vcaRules, bool isJson, const QString& projection = "{}",
+                  const QString& analysisEngine = "{}") {
+    return {{"vcaRules", vcaRules},
+            {"projection", projection},
+            {"analysisEngine", analysisEngine},
+            {"isJSON", isJson}};
+}
 
 class VcaRuleRetrieverTest : public ::testing::Test {
 protected:
+    // Answers the last request sent.
+    void reply(bool success, const QString& statusCode, const QString& text, bool flag) {
+        tools.channel.reply(tools.channel.count() - 1, success, "message", "relay", statusCode,
+                            text, flag);
+    }
+
     FakeFrameworkTools tools;
     VcaRuleRetriever retriever{&tools};
-    std::shared_ptr<RecordedAnswer> answer = std::make_shared<RecordedAnswer>();
+    ResponseRecorder answers;
+};
 
-    FakeRequestChannel::Sent onlyRequest() const {
-        EXPECT_EQ(tools.channel.count(), 1);
-        return tools.channel.sent().value(0);
+TEST_F(VcaRuleRetrieverTest, SendsRecordsWithTheIdentifiersEscaped) {
+    const QStringList ids = {"Cam-01_x.y", "caf\xC3\xA9 %1 %2 {}", "", "a&b<c>d\"e'f",
+                             "1</Cam><Cam>2"};
+    for (const QString& id : ids) {
+        retriever.getLiveVcaRule(id, answers.callback());
+        retriever.getRecordingVcaRule({id, "L2"}, 1700000000, answers.callback());
     }
-};
+    retriever.getRecordingVcaRule({}, static_cast<quint64>(qint64(-5)), answers.callback());
 
-struct EscapeCase {
-    QString id;
-    QString escaped;
-};
-
-class RequestEscapingTest
-    : public VcaRuleRetrieverTest
-    , public ::testing::WithParamInterface<EscapeCase> {};
-
-TEST_P(RequestEscapingTest, LiveRequestCarriesTheCameraEscaped) {
-    retriever.getLiveVcaRule(GetParam().id, RecordedAnswer::recorder(answer));
-    EXPECT_EQ(onlyRequest().info.content,
-              "<GetVCARules><Cam>" + GetParam().escaped + "</Cam></GetVCARules>");
+    QStringList sent;
+    for (const FakeRequestChannel::Sent& request : tools.channel.sent()) {
+        EXPECT_EQ(request.pluginID, PLUGIN_ID);
+        EXPECT_EQ(request.context, FakeRequestChannel::contextValue());
+        EXPECT_FALSE(request.info.flag);
+        EXPECT_EQ(request.info.timeoutMs, 15000);
+        EXPECT_TRUE(request.info.extra.isEmpty());
+        sent << QString::number(request.kind) + " " + request.command + " " + request.info.content;
+    }
+    const QStringList escaped = {"Cam-01_x.y", "caf\xC3\xA9 %1 %2 {}", "",
+                                 "a&amp;b&lt;c&gt;d&quot;e&apos;f", "1&lt;/Cam&gt;&lt;Cam&gt;2"};
+    QStringList expected;
+    for (const QString& id : escaped)
+        expected << "1 GetVCARules <GetVCARules><Cam>" + id + "</Cam></GetVCARules>"
+                 << "4 GetRecordingVCARules <GetRecordingVCARules><QueryTime>1700000000"
+                    "</QueryTime><Loc>" +
+                        id + "</Loc><Loc>L2</Loc></GetRecordingVCARules>";
+    expected << "4 GetRecordingVCARules <GetRecordingVCARules><QueryTime>-5</QueryTime>"
+                "</GetRecordingVCARules>";
+    EXPECT_EQ(sent.join('\n').toStdString(), expected.join('\n').toStdString());
+    EXPECT_TRUE(answers.responses().isEmpty());
 }
 
-TEST_P(RequestEscapingTest, RecordingRequestCarriesEachLocationEscaped) {
-    retriever.getRecordingVcaRule({GetParam().id, "L2"}, 1700000000,
-                                  RecordedAnswer::recorder(answer));
-    EXPECT_EQ(onlyRequest().info.content,
-              "<GetRecordingVCARules><QueryTime>1700000000</QueryTime><Loc>" + GetParam().escaped +
-                  "</Loc><Loc>L2</Loc></GetRecordingVCARules>");
+// The first reply argument is mirrored; the status is hexadecimal, failing with bit 31.
+TEST_F(VcaRuleRetrieverTest, StatusDecidesTheCodeOfLiveAndRecordingAnswers) {
+    const struct {
+        bool success;
+        const char* status;
+        bool failed;
+    } rows[] = {{false, "0", true},       {true, "80000404", true},   {true, "80000000", true},
+                {true, "FFFFFFFF", true}, {true, "0x8000ABCD", true}, {true, "0", false},
+                {true, "1", false},       {true, "7fffffff", false},  {true, "180000000", false},
+                {true, "xyz", false},     {true, "", false}};
+    const QString recording = recordingReply("<Location><LocName>L1</LocName></Location>");
+    QList<Response> expected;
+    bool flag = false;
+    for (const auto& row : rows) {
+        flag = !flag;
+        retriever.getLiveVcaRule("c", answers.callback());
+        reply(row.success, row.status, LIVE_REPLY, flag);
+        retriever.getRecordingVcaRule({"L1"}, 1, answers.callback());
+        reply(row.success, row.status, recording, flag);
+        const QString code = row.failed ? "-1" : "0";
+        const QVariant recorded = row.failed ? QVariant() : QVariantMap{{"L1", entry("", true)}};
+        expected << Response{flag, code, "", LIVE_RESULT} << Response{flag, code, "", recorded};
+    }
+    EXPECT_EQ(answers.responses(), expected);
+}
+
+TEST_F(VcaRuleRetrieverTest, FailedLiveFetchWithoutTextAnswersTheEmptyXmlForm) {
+    retriever.getLiveVcaRule("c", answers.callback());
+    reply(false, "", "", true);
+    const QVariantMap empty{{"camID", ""},
+                            {"relayPath", "relay"},
+                            {"isJSON", false},
+                            {"rules", "<?xml version='1.0' encoding='UTF-8'?><Rules></Rules>"}};
+    EXPECT_EQ(answers.responses(), (QList<Response>{{true, "-1", "", empty}}));
+}
+
+const QString XML_RULES_PREFIX = QStringLiteral(
+    "<?xml version='1.0' encoding='UTF-8'?><Projection /><AE /><Rules Format = \"xml\">");
+
+struct RecordingCase {
+    const char* label;
+    QString reply;
+    QVariant expected; // invalid: the answer is "-1"
+};
+
+void PrintTo(const RecordingCase& row, std::ostream* out) {
+    *out << row.label;
+}
+
+class RecordingReplyTest
+    : public VcaRuleRetrieverTest
+    , public ::testing::WithParamInterface<RecordingCase> {};
+
+TEST_P(RecordingReplyTest, AnswersOneEntryPerLocation) {
+    retriever.getRecordingVcaRule({"L1", "L2"}, 1700000000, answers.callback());
+    reply(true, "0", GetParam().reply, true);
+    const QString code = GetParam().expected.isValid() ? "0" : "-1";
+    EXPECT_EQ(answers.responses(), (QList<Response>{{true, code, "", GetParam().expected}}));
 }
 
 INSTANTIATE_TEST_SUITE_P(
-    Identifiers, RequestEscapingTest,
-    ::testing::Values(EscapeCase{"Cam-01_x.y", "Cam-01_x.y"},
-                      EscapeCase{"caf\xC3\xA9 %1 %2 {}", "caf\xC3\xA9 %1 %2 {}"},
-                      EscapeCase{"", ""},
-                      EscapeCase{"a&b<c>d\"e'f", "a&amp;b&lt;c&gt;d&quot;e&apos;f"},
-                      EscapeCase{"1</Cam><Cam>2", "1&lt;/Cam&gt;&lt;Cam&gt;2"}));
-
-TEST_F(VcaRuleRetrieverTest, LiveRequestRecord) {
-    retriever.getLiveVcaRule("cam1", RecordedAnswer::recorder(answer));
-    const FakeRequestChannel::Sent sent = onlyRequest();
-    EXPECT_EQ(sent.pluginID, PLUGIN_ID);
-    EXPECT_EQ(sent.context, FakeRequestChannel::contextValue());
-    EXPECT_EQ(sent.kind, 1);
-    EXPECT_EQ(sent.command, "GetVCARules");
-    EXPECT_FALSE(sent.info.flag);
-    EXPECT_EQ(sent.info.timeoutMs, 15000);
-    EXPECT_TRUE(sent.info.extra.isEmpty());
-    EXPECT_TRUE(static_cast<bool>(sent.info.callback));
-    EXPECT_EQ(answer->calls, 0);
-}
-
-TEST_F(VcaRuleRetrieverTest, RecordingRequestRecord) {
-    retriever.getRecordingVcaRule({}, 5, RecordedAnswer::recorder(answer));
-    const FakeRequestChannel::Sent sent = onlyRequest();
-    EXPECT_EQ(sent.pluginID, PLUGIN_ID);
-    EXPECT_EQ(sent.context, FakeRequestChannel::contextValue());
-    EXPECT_EQ(sent.kind, 4);
-    EXPECT_EQ(sent.command, "GetRecordingVCARules");
-    EXPECT_FALSE(sent.info.flag);
-    EXPECT_EQ(sent.info.timeoutMs, 15000);
-    EXPECT_TRUE(sent.info.extra.isEmpty());
-    EXPECT_EQ(sent.info.content,
-              "<GetRecordingVCARules><QueryTime>5</QueryTime></GetRecordingVCARules>");
-    EXPECT_EQ(answer->calls, 0);
-}
-
-TEST_F(VcaRuleRetrieverTest, RecordingRequestWritesANegativeTime) {
-    retriever.getRecordingVcaRule({"L1"}, static_cast<quint64>(qint64(-5)),
-                                  RecordedAnswer::recorder(answer));
-    EXPECT_EQ(onlyRequest().info.content,
-              "<GetRecordingVCARules><QueryTime>-5</QueryTime><Loc>L1</Loc>"
-              "</GetRecordingVCARules>");
-}
-
-struct LiveOutcomeCase {
-    bool success;
-    QString statusCode;
-    QString code;
-};
-
-class LiveOutcomeTest
-    : public VcaRuleRetrieverTest
-    , public ::testing::WithParamInterface<LiveOutcomeCase> {};
-
-TEST_P(LiveOutcomeTest, AnswersTheCodeWithTheConvertedMap) {
-    const QString reply =
-        QStringLiteral("<GetVCARulesRes><Camera><CamName>c</CamName><Rules Format=\"json\">"
-                       "<Rule Type=\"A\" Name=\"r\">1</Rule></Rules></Camera></GetVCARulesRes>");
-    for (const bool flag : {true, false}) {
-        retriever.getLiveVcaRule("c", RecordedAnswer::recorder(answer));
-        tools.channel.reply(tools.channel.count() - 1, GetParam().success, "message", "relay",
-                            GetParam().statusCode, reply, flag);
-        EXPECT_EQ(answer->handled, flag);
-        EXPECT_EQ(answer->code, GetParam().code);
-        EXPECT_TRUE(answer->message.isEmpty());
-        const QVariantMap expected{{"camID", "c"},
-                                   {"relayPath", "relay"},
-                                   {"isJSON", true},
-                                   {"rules", R"({"A":{"r":1}})"}};
-        EXPECT_EQ(answer->payload, QVariant(expected));
-    }
-    EXPECT_EQ(answer->calls, 2);
-}
-
-INSTANTIATE_TEST_SUITE_P(
-    StatusCodes, LiveOutcomeTest,
-    ::testing::Values(LiveOutcomeCase{false, "0", "-1"}, LiveOutcomeCase{true, "80000404", "-1"},
-                      LiveOutcomeCase{true, "80000000", "-1"},
-                      LiveOutcomeCase{true, "FFFFFFFF", "-1"}, LiveOutcomeCase{true, "0", "0"},
-                      LiveOutcomeCase{true, "1", "0"}, LiveOutcomeCase{true, "7FFFFFFF", "0"},
-                      LiveOutcomeCase{true, "180000000", "0"}, LiveOutcomeCase{true, "xyz", "0"},
-                      LiveOutcomeCase{true, "", "0"}));
-
-TEST_F(VcaRuleRetrieverTest, FailedLiveFetchWithEmptyTextAnswersTheEmptyXmlForm) {
-    for (const bool flag : {true, false}) {
-        retriever.getLiveVcaRule("c", RecordedAnswer::recorder(answer));
-        tools.channel.reply(tools.channel.count() - 1, false, QString(), "relay/9", QString(),
-                            QString(), flag);
-        EXPECT_EQ(answer->handled, flag);
-        EXPECT_EQ(answer->code, "-1");
-        const QVariantMap expected{
-            {"camID", ""}, {"relayPath", "relay/9"}, {"isJSON", false}, {"rules", EMPTY_XML_RULES}};
-        EXPECT_EQ(answer->payload, QVariant(expected));
-    }
-}
+    Replies, RecordingReplyTest,
+    ::testing::Values(
+        RecordingCase{
+            "JsonForm",
+            recordingReply("<Location><LocName>L1</LocName><JsonRules>{\"A\":%20\"caf%C3%A9\"}"
+                           "</JsonRules><Projection>%7B%22p%22%3A1%7D</Projection>"
+                           "<AnalysisEngine>%7B%22e%22%3A2%7D</AnalysisEngine></Location>"),
+            QVariantMap{{"L1", entry("{\"A\": \"caf\xC3\xA9\"}", true, "{\"p\":1}", "{\"e\":2}")}}},
+        RecordingCase{"XmlForm",
+                      recordingReply("<Location>\n  <LocName>L1</LocName>\n  <JsonRules><Rule "
+                                     "Type=\"A\">x \n\t y</Rule><Rule Type=\"B\"/></JsonRules>\n"
+                                     "</Location>\n"),
+                      QVariantMap{{"L1", entry(XML_RULES_PREFIX + "<Rule Type=\"A\">x y</Rule>"
+                                                                  "<Rule Type=\"B\"/></Rules>",
+                                               false)}}},
+        RecordingCase{
+            "EmptyAndSelfClosingRules",
+            recordingReply("<Location><LocName>L1</LocName><JsonRules></JsonRules></Location>"
+                           "<Location><LocName>L2</LocName><JsonRules/></Location>"
+                           "<Location><LocName>L3</LocName><JsonRules /></Location>"),
+            QVariantMap{{"L1", entry("", true)}, {"L2", entry("", true)}, {"L3", entry("", true)}}},
+        RecordingCase{"WhiteSpaceBeforeJsonMakesXmlForm",
+                      recordingReply("<Location><LocName>L1</LocName><JsonRules>\n  {\"a\":1}"
+                                     "</JsonRules></Location>"),
+                      QVariantMap{{"L1", entry(XML_RULES_PREFIX + " {\"a\":1}</Rules>", false)}}},
+        RecordingCase{
+            "AbsentAndEmptyProjection",
+            recordingReply("<Location><LocName>L1</LocName><JsonRules>{}</JsonRules></Location>"
+                           "<Location><LocName>L2</LocName><JsonRules>{}</JsonRules><Projection/>"
+                           "<AnalysisEngine></AnalysisEngine></Location>"),
+            QVariantMap{{"L1", entry("{}", true)}, {"L2", entry("{}", true, "", "")}}},
+        RecordingCase{
+            "LaterLocNameStands",
+            recordingReply("<Location><LocName>L1</LocName><JsonRules>{\"n\":1}</JsonRules>"
+                           "</Location><Location><LocName>L1</LocName><JsonRules>{\"n\":2}"
+                           "</JsonRules></Location>"),
+            QVariantMap{{"L1", entry("{\"n\":2}", true)}}},
+        RecordingCase{"NoLocation", recordingReply(""), QVariantMap{}},
+        RecordingCase{"SelfClosingRoot", "<GetRecordingVCARulesRes/>", QVariantMap{}},
+        RecordingCase{
+            "FewerRuleContentsThanLocations",
+            recordingReply("<Location><LocName>L1</LocName><JsonRules><Rule/></JsonRules>"
+                           "</Location><Location><LocName>L2</LocName></Location>"
+                           "<Location><LocName>L3</LocName><Projection>p</Projection></Location>"),
+            QVariantMap{{"L1", entry(XML_RULES_PREFIX + "<Rule/></Rules>", false)},
+                        {"L2", entry("", true)},
+                        {"L3", entry("", true, "p")}}},
+        RecordingCase{"EmptyText", "", QVariant()}, RecordingCase{"NotXml", "not xml", QVariant()},
+        RecordingCase{"Unterminated", "<GetRecordingVCARulesRes><Location>", QVariant()}),
+    [](const ::testing::TestParamInfo<RecordingCase>& info) { return info.param.label; });
 
 TEST_F(VcaRuleRetrieverTest, ReplyAfterTheRetrieverIsGoneIsStillAnswered) {
     {
         VcaRuleRetriever shortLived(&tools);
-        shortLived.getLiveVcaRule("c", RecordedAnswer::recorder(answer));
-        shortLived.getRecordingVcaRule({"L"}, 1, RecordedAnswer::recorder(answer));
+        shortLived.getLiveVcaRule("c", answers.callback());
+        shortLived.getRecordingVcaRule({"L"}, 1, answers.callback());
     }
-    tools.channel.reply(0, true, QString(), "r", "0", QString(), true);
-    EXPECT_EQ(answer->code, "0");
-    tools.channel.reply(1, true, QString(), "r", "0", "<GetRecordingVCARulesRes/>", true);
-    EXPECT_EQ(answer->code, "0");
-    EXPECT_EQ(answer->calls, 2);
+    tools.channel.reply(0, true, "", "r", "0", "", true);
+    tools.channel.reply(1, true, "", "r", "0", "<GetRecordingVCARulesRes/>", true);
+    ASSERT_EQ(answers.responses().size(), 2);
+    EXPECT_EQ(answers.responses()[1], (Response{true, "0", "", QVariantMap{}}));
 }
 
 class NoChannelTools : public FakeFrameworkTools {
@@ -163,23 +205,14 @@ public:
 
 TEST(VcaRuleRetrieverUnavailableTest, AnswersFailureWithoutPrivateObjectOrChannel) {
     NoChannelTools noChannel;
-    const VcaRuleRetriever withoutChannel(&noChannel);
-    const VcaRuleRetriever withoutTools(nullptr);
-    for (VcaRuleRetriever retriever : {VcaRuleRetriever(), withoutChannel, withoutTools}) {
-        auto live = std::make_shared<RecordedAnswer>();
-        auto recording = std::make_shared<RecordedAnswer>();
-        live->handled = recording->handled = true;
-        retriever.getLiveVcaRule("c", RecordedAnswer::recorder(live));
-        retriever.getRecordingVcaRule({"L"}, 1, RecordedAnswer::recorder(recording));
-        for (const auto& answer : {live, recording}) {
-            EXPECT_EQ(answer->calls, 1);
-            EXPECT_FALSE(answer->handled);
-            EXPECT_EQ(answer->code, "-1");
-            EXPECT_TRUE(answer->message.isEmpty());
-            EXPECT_FALSE(answer->payload.isValid());
-        }
+    ResponseRecorder answers;
+    for (VcaRuleRetriever retriever :
+         {VcaRuleRetriever(), VcaRuleRetriever(&noChannel), VcaRuleRetriever(nullptr)}) {
+        retriever.getLiveVcaRule("c", answers.callback());
+        retriever.getRecordingVcaRule({"L"}, 1, answers.callback());
         retriever.getLiveVcaRule("c", ResponseCallback());
     }
+    EXPECT_EQ(answers.responses(), QList<Response>(6, Response{false, "-1", "", QVariant()}));
 }
 
 } // namespace

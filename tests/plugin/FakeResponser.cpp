@@ -1,5 +1,0 @@
-#include "FakeResponser.h"
-
-void FakeResponser::Respond(bool, const QString&, const QString&, const QVariant&) {
-    ++count;
-}
