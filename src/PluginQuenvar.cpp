@@ -57,6 +57,16 @@ std::function<void(bool, QList<QString>)> presetListAdapter(const ResponseCallba
     };
 }
 
+// The host may deliver a rule answer after the plugin is gone: it then reaches no one.
+ResponseCallback whilePluginLives(const std::weak_ptr<SubscriberList>& plugin,
+                                  ResponseCallback callback) {
+    return [plugin, callback = std::move(callback)](
+               bool handled, const QString& code, const QString& message, const QVariant& payload) {
+        if (const auto alive = plugin.lock(); alive && callback)
+            callback(handled, code, message, payload);
+    };
+}
+
 using CameraOperation = void (*)(ICameraProxy&, const QVariantMap&, const ResponseCallback&);
 
 struct CameraCommand {
@@ -132,7 +142,8 @@ void PluginQuenvar::Request(const QString& command, const QVariant& params,
     try {
         if (command == CMD_RETRIEVE_VCA_RAW_RULE_INFO) {
             if (const auto retriever = vcaRuleRetriever)
-                retriever->getLiveVcaRule(params.toString(), std::move(callback));
+                retriever->getLiveVcaRule(params.toString(),
+                                          whilePluginLives(subscribers, std::move(callback)));
             else
                 answer(callback, false, QVariant());
             return;
@@ -144,7 +155,8 @@ void PluginQuenvar::Request(const QString& command, const QVariant& params,
                 const auto timestamp =
                     static_cast<quint64>(static_cast<qint64>(map.value(KEY_TIMESTAMP).toInt()));
                 retriever->getRecordingVcaRule(map.value(KEY_LOCATION_IDS).toStringList(),
-                                               timestamp, std::move(callback));
+                                               timestamp,
+                                               whilePluginLives(subscribers, std::move(callback)));
             } else {
                 answer(callback, false, QVariant());
             }

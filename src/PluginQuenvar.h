@@ -48,8 +48,8 @@ public slots:
 private:
     std::shared_ptr<VcaRuleRetriever> vcaRuleRetriever;
     std::shared_ptr<ICameraProxy> cameraProxy;
-    // Shared with pending rule answers, which hold it weakly: once this object is gone they
-    // deliver nothing.
+    // Shared with pending rule answers, events and client answers alike, which hold it weakly:
+    // once this object is gone they deliver nothing.
     std::shared_ptr<SubscriberList> subscribers;
     IPluginConnector* pluginConnector = nullptr;
 };
