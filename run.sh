@@ -1,5 +1,5 @@
 #!/usr/bin/env bash
-# Set-up, build and run. Usage: ./run.sh demo | ./run.sh test
+# Set-up, build and run. Usage: ./run.sh demo | ./run.sh test | ./run.sh bench
 set -euo pipefail
 cd "$(dirname "$0")"
 
@@ -7,6 +7,8 @@ PACKAGES=(cmake ninja-build g++ pkg-config ccache openssl qt6-base-dev libgtest-
     libcpp-httplib-dev libssl-dev)
 # The demo reads the event stream with curl and formats JSON with jq.
 DEMO_PACKAGES=(curl jq)
+# Benchmarks: Google Benchmark, and the peers they are measured against.
+BENCH_PACKAGES=(libbenchmark-dev nginx-light wrk python3)
 
 as_root() {
     if [ "$(id -u)" -eq 0 ]; then "$@"; else sudo "$@"; fi
@@ -47,8 +49,14 @@ test)
     build build Debug
     (cd build && ctest --output-on-failure --timeout 300 -j"$(nproc)")
     ;;
+bench)
+    ensure_packages "${PACKAGES[@]}" "${BENCH_PACKAGES[@]}"
+    build build-bench Release -DQUENVAR_BUILD_BENCH=ON -DQUENVAR_BUILD_TESTS=OFF \
+        -DQUENVAR_BUILD_TOOLS=OFF
+    bench/run_bench.py build-bench
+    ;;
 *)
-    echo "usage: $0 demo|test" >&2
+    echo "usage: $0 demo|test|bench" >&2
     exit 2
     ;;
 esac

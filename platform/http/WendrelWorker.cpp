@@ -19,11 +19,6 @@
 
 namespace {
 
-#if QT_VERSION >= QT_VERSION_CHECK(6, 5, 0)
-// Qt's default of 6 would hold back most of many parallel requests to one camera.
-const int CONNECTIONS_PER_HOST = 16;
-#endif
-
 QString originOf(const QUrl& url) {
     const bool tls = url.scheme() == QLatin1String("https");
     return url.scheme() + QLatin1Char(' ') + url.host() + QLatin1Char(' ') +
@@ -142,7 +137,7 @@ QNetworkRequest WendrelWorker::networkRequest(const WendrelRequest& request) {
     result.setAttribute(QNetworkRequest::CookieSaveControlAttribute, QNetworkRequest::Manual);
 #if QT_VERSION >= QT_VERSION_CHECK(6, 5, 0)
     QHttp1Configuration http1;
-    http1.setNumberOfConnectionsPerHost(CONNECTIONS_PER_HOST);
+    http1.setNumberOfConnectionsPerHost(connectionsPerOrigin);
     result.setHttp1Configuration(http1);
 #endif
     for (const QString& header : request.headers) {
@@ -200,6 +195,7 @@ void WendrelWorker::launchWaiting(const QString& originKey) {
     if (launching)
         return;
     launching = true;
+    const Clock::time_point now = Clock::now();
     while (!closing) {
         const auto found = origins.find(originKey);
         if (found == origins.end())
@@ -214,10 +210,17 @@ void WendrelWorker::launchWaiting(const QString& originKey) {
             break;
         const Id id = origin.waiting.front();
         origin.waiting.pop_front();
-        if (pending.count(id) != 0) {
-            ++origin.active;
-            launch(id, {});
-        }
+        const auto entry = pending.find(id);
+        if (entry == pending.end())
+            continue;
+        // One whose deadline passed while it waited is left to expireDeadlines, unsent: when a
+        // whole queue expires together, launching each only to abort it would pile up replies
+        // that are deleted only after the last of them, and delay every answer behind them.
+        const Deadlines::iterator deadline = entry->second.deadline;
+        if (deadline != deadlines.end() && deadline->first <= now)
+            continue;
+        ++origin.active;
+        launch(id, {});
     }
     launching = false;
 }

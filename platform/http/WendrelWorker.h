@@ -36,7 +36,15 @@ public:
     void shutdown();
 
     static constexpr qint64 maxBodySize = 8 * 1024 * 1024;
-    static constexpr int activePerOrigin = 32;
+    // Connections Qt opens to one server; before Qt 6.5 its fixed default.
+#if QT_VERSION >= QT_VERSION_CHECK(6, 5, 0)
+    static constexpr int connectionsPerOrigin = 16;
+#else
+    static constexpr int connectionsPerOrigin = 6;
+#endif
+    // Two per connection: Qt starts the next as soon as an answer ends, and no more wait inside
+    // Qt, where a waiting request costs about twenty times what it costs here.
+    static constexpr int activePerOrigin = 2 * connectionsPerOrigin;
 
 private:
     using Clock = WendrelRequest::Clock;
