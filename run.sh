@@ -1,5 +1,6 @@
 #!/usr/bin/env bash
-# Set-up, build and run. Usage: ./run.sh demo | ./run.sh test | ./run.sh bench
+# Set-up, build and run. Usage: ./run.sh demo | ./run.sh test [--asan|--tsan [CTEST_ARGS...]] |
+# ./run.sh bench | ./run.sh fuzz [SECONDS]
 set -euo pipefail
 cd "$(dirname "$0")"
 
@@ -9,6 +10,8 @@ PACKAGES=(cmake ninja-build g++ pkg-config ccache openssl qt6-base-dev libgtest-
 DEMO_PACKAGES=(curl jq)
 # Benchmarks: Google Benchmark, and the peers they are measured against.
 BENCH_PACKAGES=(libbenchmark-dev nginx-light wrk python3)
+# AddressSanitizer builds and fuzzing: clang, its sanitizer runtimes, llvm-symbolizer for traces.
+CLANG_PACKAGES=(clang libclang-rt-14-dev llvm)
 
 as_root() {
     if [ "$(id -u)" -eq 0 ]; then "$@"; else sudo "$@"; fi
@@ -45,9 +48,33 @@ demo)
     tools/demo/demo.sh build
     ;;
 test)
-    ensure_packages "${PACKAGES[@]}"
-    build build Debug
-    (cd build && ctest --output-on-failure --timeout 300 -j"$(nproc)")
+    case "${2:-}" in
+    "")
+        ensure_packages "${PACKAGES[@]}"
+        build build Debug
+        (cd build && ctest --output-on-failure --timeout 300 -j"$(nproc)")
+        ;;
+    --asan)
+        ensure_packages "${PACKAGES[@]}" "${CLANG_PACKAGES[@]}"
+        flags="-fsanitize=address,undefined -fno-sanitize-recover=undefined -fno-omit-frame-pointer"
+        build build-asan Debug -DCMAKE_CXX_COMPILER=clang++ "-DCMAKE_CXX_FLAGS=$flags"
+        (cd build-asan && ASAN_OPTIONS=detect_leaks=1 UBSAN_OPTIONS=print_stacktrace=1 \
+            ctest --output-on-failure --timeout 300 -j"$(nproc)" "${@:3}")
+        ;;
+    --tsan)
+        # GCC's ThreadSanitizer: clang 14's aborts as soon as Qt starts a child process.
+        ensure_packages "${PACKAGES[@]}"
+        build build-tsan Debug -DCMAKE_CXX_COMPILER=g++ \
+            "-DCMAKE_CXX_FLAGS=-fsanitize=thread -fno-omit-frame-pointer"
+        suppressions="$PWD/tests/tsan.supp"
+        (cd build-tsan && TSAN_OPTIONS="suppressions=$suppressions" \
+            ctest --output-on-failure --timeout 300 -j"$(nproc)" "${@:3}")
+        ;;
+    *)
+        echo "usage: $0 test [--asan|--tsan [CTEST_ARGS...]]" >&2
+        exit 2
+        ;;
+    esac
     ;;
 bench)
     ensure_packages "${PACKAGES[@]}" "${BENCH_PACKAGES[@]}"
@@ -55,8 +82,12 @@ bench)
         -DQUENVAR_BUILD_TOOLS=OFF
     bench/run_bench.py build-bench
     ;;
+fuzz)
+    ensure_packages "${PACKAGES[@]}" "${CLANG_PACKAGES[@]}"
+    tests/fuzz/fuzz.sh build-fuzz "${2:-60}"
+    ;;
 *)
-    echo "usage: $0 demo|test|bench" >&2
+    echo "usage: $0 demo|test|bench|fuzz" >&2
     exit 2
     ;;
 esac
