@@ -60,13 +60,15 @@ bool HostRequestChannel::SendRequest(const QString& pluginID, Context context, i
     QMetaObject::invokeMethod(
         mainThread,
         [=]() {
-            QTimer::singleShot(
-                std::max<qint64>(deadline.remainingTime(), 0), mainThread, [routed, number]() {
-                    if (routed->deliver(false, QStringLiteral("timeout"), QString(), STATUS_TIMEOUT,
-                                        QString(), false))
-                        HostLog::trace(__FILE__, __LINE__,
-                                       QStringLiteral("request %1 timed out").arg(number));
-                });
+            // Precise: a coarse timer may fire up to 5% before the record's time-out.
+            QTimer::singleShot(std::max<qint64>(deadline.remainingTime(), 0), Qt::PreciseTimer,
+                               mainThread, [routed, number]() {
+                                   if (routed->deliver(false, QStringLiteral("timeout"), QString(),
+                                                       STATUS_TIMEOUT, QString(), false))
+                                       HostLog::trace(
+                                           __FILE__, __LINE__,
+                                           QStringLiteral("request %1 timed out").arg(number));
+                               });
             // A plugin that throws is left to the time-out: the exception must not reach the
             // event loop.
             try {
