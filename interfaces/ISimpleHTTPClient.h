@@ -35,10 +35,9 @@ public:
                                HttpReplyCallback callback, uint timeout) = 0;
     virtual bool Delete(const QString& host, const QByteArray& body, const QString& path,
                         quint16 port, bool useSSL, const QString& user, const QString& password,
-                        const QString& contentType, HttpReplyCallback callback,
-                        uint timeout) = 0;
-    virtual bool Put(const QString& host, const QByteArray& body, const QString& path,
-                     quint16 port, bool useSSL, const QString& user, const QString& password,
+                        const QString& contentType, HttpReplyCallback callback, uint timeout) = 0;
+    virtual bool Put(const QString& host, const QByteArray& body, const QString& path, quint16 port,
+                     bool useSSL, const QString& user, const QString& password,
                      const QString& contentType, HttpReplyCallback callback, uint timeout) = 0;
     virtual ~ISimpleHTTPClient() = default;
 };

@@ -13,19 +13,23 @@
 class ICameraProxy {
 public:
     virtual ~ICameraProxy() = default;
-    virtual void getPTZIdleAction(const QVariantMap& params,
-                                  const std::function<void(bool, const QVariantMap&)>& callback) = 0;
+    virtual void
+    getPTZIdleAction(const QVariantMap& params,
+                     const std::function<void(bool, const QVariantMap&)>& callback) = 0;
     virtual void setPTZIdleAction(const QVariantMap& params,
                                   const std::function<void(bool)>& callback) = 0;
-    virtual void getPTZTrackingType(const QVariantMap& params,
-                                    const std::function<void(bool, const QVariantMap&)>& callback) = 0;
+    virtual void
+    getPTZTrackingType(const QVariantMap& params,
+                       const std::function<void(bool, const QVariantMap&)>& callback) = 0;
     virtual void setPTZTrackingType(const QVariantMap& params,
                                     const std::function<void(bool)>& callback) = 0;
     virtual void stopPTZMovement(const QVariantMap& params,
                                  const std::function<void(bool)>& callback) = 0;
     virtual void areaZoom(const QVariantMap& params, const std::function<void(bool)>& callback) = 0;
-    virtual void gotoSmartTrackingAdvPreset(
-        const QVariantMap& params, const std::function<void(bool, const QVariant&)>& callback) = 0;
-    virtual void getSmartTrackingAdvPresetList(
-        const QVariantMap& params, const std::function<void(bool, QList<QString>)>& callback) = 0;
+    virtual void
+    gotoSmartTrackingAdvPreset(const QVariantMap& params,
+                               const std::function<void(bool, const QVariant&)>& callback) = 0;
+    virtual void
+    getSmartTrackingAdvPresetList(const QVariantMap& params,
+                                  const std::function<void(bool, QList<QString>)>& callback) = 0;
 };
