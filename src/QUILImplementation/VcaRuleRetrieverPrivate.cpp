@@ -126,45 +126,46 @@ void guarded(const char* tag, Handler&& handler) {
 void VcaRuleRetriever::VcaRuleRetrieverPrivate::getLiveVcaRule(const QString& cameraId,
                                                                ResponseCallback callback) {
     if (!requestChannel) {
-        if (callback)
-            callback(false, CODE_FAILED, QString(), QVariant());
+        answer(callback, false, false, QVariant());
         return;
     }
-    PluginRequestInfo info;
-    info.flag = false;
-    info.timeoutMs = REQUEST_TIMEOUT_MS;
-    info.content = liveRequestXml(cameraId);
-    info.callback = [callback = std::move(callback)](
-                        bool success, const QString&, const QString& relayPath,
-                        const QString& statusCode, const QString& replyText, bool flag) {
-        guarded("queryLiveVCARuleCB", [&] {
-            queryLiveVCARuleCB(success, relayPath, statusCode, replyText, flag, callback);
-        });
-    };
-    const IPluginRequestChannel::Context context = requestChannel->GetRequestContext();
-    requestChannel->SendRequest(PLUGIN_ID, context, LIVE_REQUEST_KIND, VCA_CMD_GET_VCA_RULES, info);
+    send(LIVE_REQUEST_KIND, VCA_CMD_GET_VCA_RULES, liveRequestXml(cameraId),
+         [callback = std::move(callback)](bool success, const QString&, const QString& relayPath,
+                                          const QString& statusCode, const QString& replyText,
+                                          bool flag) {
+             guarded("queryLiveVCARuleCB", [&] {
+                 queryLiveVCARuleCB(success, relayPath, statusCode, replyText, flag, callback);
+             });
+         });
 }
 
 void VcaRuleRetriever::VcaRuleRetrieverPrivate::getRecordingVcaRule(
     const QList<QString>& locationIDs, quint64 timestamp, ResponseCallback callback) {
     if (!requestChannel) {
-        if (callback)
-            callback(false, CODE_FAILED, QString(), QVariant());
+        answer(callback, false, false, QVariant());
         return;
     }
+    send(RECORDING_REQUEST_KIND, VCA_CMD_GET_RECORDING_VCA_RULES,
+         recordingRequestXml(locationIDs, timestamp),
+         [callback = std::move(callback)](bool success, const QString&, const QString&,
+                                          const QString& statusCode, const QString& replyText,
+                                          bool flag) {
+             guarded("queryRecordingVCARuleCB", [&] {
+                 queryRecordingVCARuleCB(success, statusCode, replyText, flag, callback);
+             });
+         });
+}
+
+void VcaRuleRetriever::VcaRuleRetrieverPrivate::send(int kind, const QString& command,
+                                                     const QString& content,
+                                                     PluginReplyCallback reply) const {
     PluginRequestInfo info;
     info.flag = false;
     info.timeoutMs = REQUEST_TIMEOUT_MS;
-    info.content = recordingRequestXml(locationIDs, timestamp);
-    info.callback = [callback = std::move(callback)](bool success, const QString&, const QString&,
-                                                     const QString& statusCode,
-                                                     const QString& replyText, bool flag) {
-        guarded("queryRecordingVCARuleCB",
-                [&] { queryRecordingVCARuleCB(success, statusCode, replyText, flag, callback); });
-    };
+    info.content = content;
+    info.callback = std::move(reply);
     const IPluginRequestChannel::Context context = requestChannel->GetRequestContext();
-    requestChannel->SendRequest(PLUGIN_ID, context, RECORDING_REQUEST_KIND,
-                                VCA_CMD_GET_RECORDING_VCA_RULES, info);
+    requestChannel->SendRequest(PLUGIN_ID, context, kind, command, info);
 }
 
 QString VcaRuleRetriever::VcaRuleRetrieverPrivate::liveRequestXml(const QString& cameraId) {

@@ -47,4 +47,9 @@ public:
 
     // Owned by the host; null when the host handed out none.
     IPluginRequestChannel* requestChannel = nullptr;
+
+private:
+    // One request to the VCA plugin, from this plugin; reply answers it later.
+    void send(int kind, const QString& command, const QString& content,
+              PluginReplyCallback reply) const;
 };
