@@ -2,29 +2,33 @@
 
 #include "EventLoopWait.h"
 
-AnswerLedger::AnswerLedger()
-    : shared(std::make_shared<Shared>()) {
+#include <algorithm>
+
+AnswerLedger::AnswerLedger() {
     shared->clock.start();
 }
 
 ResponseCallback AnswerLedger::callback(int id) {
-    {
-        std::lock_guard<std::mutex> lock(shared->mutex);
-        shared->entries[id];
-    }
+    std::lock_guard<std::mutex> lock(shared->mutex);
+    shared->entries[id];
     return [shared = shared, id](bool handled, const QString& code, const QString& message,
                                  const QVariant& payload) {
         std::lock_guard<std::mutex> lock(shared->mutex);
-        if (shared->closed)
-            ++shared->late;
+        ++shared->calls;
         Entry& entry = shared->entries[id];
         if (entry.calls++ == 0)
-            entry = Entry{1, shared->clock.elapsed(), handled, code, message, payload};
+            entry = Entry{1, shared->clock.elapsed(), {handled, code, message, payload}};
     };
 }
 
 bool AnswerLedger::waitForAll(int timeoutMs) const {
-    return runEventLoopUntil([this] { return unanswered() == 0; }, timeoutMs);
+    return runEventLoopUntil(
+        [this] {
+            std::lock_guard<std::mutex> lock(shared->mutex);
+            return std::all_of(shared->entries.begin(), shared->entries.end(),
+                               [](const auto& entry) { return entry.second.calls > 0; });
+        },
+        timeoutMs);
 }
 
 AnswerLedger::Entry AnswerLedger::entry(int id) const {
@@ -33,28 +37,7 @@ AnswerLedger::Entry AnswerLedger::entry(int id) const {
     return found == shared->entries.end() ? Entry() : found->second;
 }
 
-int AnswerLedger::answeredTwice() const {
+int AnswerLedger::calls() const {
     std::lock_guard<std::mutex> lock(shared->mutex);
-    int count = 0;
-    for (const auto& [id, entry] : shared->entries)
-        count += entry.calls > 1 ? 1 : 0;
-    return count;
-}
-
-int AnswerLedger::unanswered() const {
-    std::lock_guard<std::mutex> lock(shared->mutex);
-    int count = 0;
-    for (const auto& [id, entry] : shared->entries)
-        count += entry.calls == 0 ? 1 : 0;
-    return count;
-}
-
-void AnswerLedger::close() {
-    std::lock_guard<std::mutex> lock(shared->mutex);
-    shared->closed = true;
-}
-
-int AnswerLedger::late() const {
-    std::lock_guard<std::mutex> lock(shared->mutex);
-    return shared->late;
+    return shared->calls;
 }

@@ -1,7 +1,8 @@
 // The eight camera commands, each with the parameters it needs besides the camera's address.
 #pragma once
 
-#include <QString>
+#include <QJsonArray>
+#include <QJsonObject>
 #include <QVariantMap>
 
 #include <array>
@@ -9,27 +10,30 @@
 struct CameraCommand {
     const char* name;
     QVariantMap params;
+    // The answer's payload when the camera request fails; undefined: the camera's body, as text.
+    QJsonValue failurePayload = {};
 
-    // The parameters with the camera's address and credentials added.
-    QVariantMap to(const QString& host, quint16 port, const QString& user, const QString& password,
-                   bool useSSL = false) const {
+    // The parameters with a loopback camera's address and credentials added.
+    QVariantMap to(quint16 port, const QString& password = "admin", bool useSSL = false) const {
         QVariantMap all = params;
-        all.insert("host", host);
-        all.insert("port", port);
-        all.insert("user", user);
-        all.insert("pass", password);
-        all.insert("useSSL", useSSL);
+        all.insert({{"host", "127.0.0.1"},
+                    {"port", port},
+                    {"user", "admin"},
+                    {"pass", password},
+                    {"useSSL", useSSL}});
         return all;
     }
 };
 
 inline const std::array<CameraCommand, 8>& cameraCommands() {
     static const std::array<CameraCommand, 8> commands{{
-        {"retrievePTZIdleAction", {}},
-        {"setPTZIdleAction", {{"enabled", "1"}, {"interval", "30"}}},
-        {"retrievePTZTrackingType", {{"nodeID", "n1"}}},
-        {"setPTZTrackingType", {{"type", "smarttracking"}}},
-        {"stopPTZMovement", {}},
+        {"retrievePTZIdleAction", {}, QJsonObject()},
+        {"setPTZIdleAction", {{"enabled", "1"}, {"interval", "30"}}, QJsonValue::Null},
+        {"retrievePTZTrackingType",
+         {{"nodeID", "n1"}},
+         QJsonObject{{"nodeID", "n1"}, {"type", "autotracking"}}},
+        {"setPTZTrackingType", {{"type", "smarttracking"}}, QJsonValue::Null},
+        {"stopPTZMovement", {}, QJsonValue::Null},
         {"areaZoom",
          {{"zoomCenterX", 320},
           {"zoomCenterY", 240},
@@ -37,9 +41,10 @@ inline const std::array<CameraCommand, 8>& cameraCommands() {
           {"viewCellHeight", 480},
           {"resolutionWidth", 1920},
           {"resolutionHeight", 1080},
-          {"zoomRatio", 1.5}}},
-        {"gotoSmartTrackingAdvPreset", {{"presetName", "Entrance"}}},
-        {"getSmartTrackingAdvPresetList", {}},
+          {"zoomRatio", 1.5}},
+         QJsonValue::Null},
+        {"gotoSmartTrackingAdvPreset", {{"presetName", "Entrance"}}, QJsonValue::Undefined},
+        {"getSmartTrackingAdvPresetList", {}, QJsonArray()},
     }};
     return commands;
 }

@@ -19,12 +19,16 @@ const int READ_TIMEOUT_S = 40;
 
 } // namespace
 
-bool ServedHost::start(const QStringList& arguments, const QProcessEnvironment& environment) {
-    return process.start(BuildPaths::bin(QStringLiteral("quenvar-host")),
-                         QStringList{QStringLiteral("serve"), QStringLiteral("--listen"),
-                                     QStringLiteral("127.0.0.1:0")} +
-                             arguments,
-                         environment);
+QJsonObject ServedHost::request(const QString& command, const QVariant& params) {
+    return {{"command", command}, {"params", QJsonValue::fromVariant(params)}};
+}
+
+bool ServedHost::serve(const QStringList& arguments, const QProcessEnvironment& environment) {
+    return start(BuildPaths::bin(QStringLiteral("quenvar-host")),
+                 QStringList{QStringLiteral("serve"), QStringLiteral("--listen"),
+                             QStringLiteral("127.0.0.1:0")} +
+                     arguments,
+                 environment);
 }
 
 QList<ServedHost::Answer> ServedHost::post(const QList<QJsonObject>& requests) const {
@@ -36,7 +40,7 @@ QList<ServedHost::Answer> ServedHost::post(const QList<QJsonObject>& requests) c
     for (qsizetype i = 0; i < requests.size(); ++i) {
         const std::string body = QJsonDocument(requests.at(i)).toJson().toStdString();
         senders.emplace_back([this, body, &answer = answers[i], &clock, &open] {
-            httplib::Client client("127.0.0.1", process.port());
+            httplib::Client client("127.0.0.1", port());
             client.set_read_timeout(READ_TIMEOUT_S, 0);
             const httplib::Result result = client.Post("/api/request", body, "application/json");
             answer.elapsedMs = clock.elapsed();
@@ -53,12 +57,4 @@ QList<ServedHost::Answer> ServedHost::post(const QList<QJsonObject>& requests) c
     for (std::thread& sender : senders)
         sender.join();
     return answers;
-}
-
-int ServedHost::stop() {
-    return process.stop();
-}
-
-QString ServedHost::errorOutput() const {
-    return process.errorOutput();
 }

@@ -4,10 +4,10 @@
 
 #include <QJsonObject>
 #include <QList>
-#include <QProcessEnvironment>
 
-// quenvar-host serve with the build's plugins on a free port, and client requests to it.
-class ServedHost {
+// quenvar-host serve with the build's plugins on a free port, and client requests to it. Its
+// exit code from stop() is not 0 after a crash or, under ASan, a leak.
+class ServedHost : public ListeningProcess {
 public:
     struct Answer {
         int status = 0; // 0: no HTTP answer
@@ -15,15 +15,11 @@ public:
         qint64 elapsedMs = -1;
     };
 
-    bool start(const QStringList& arguments = {},
-               const QProcessEnvironment& environment = QProcessEnvironment::systemEnvironment());
-    // Sends every {"command", "params"} request at once, each on a connection of its own, and
-    // returns the answers in the same order.
-    QList<Answer> post(const QList<QJsonObject>& requests) const;
-    // Stops the host: its exit code, which is not 0 after a crash or, under ASan, a leak.
-    int stop();
-    QString errorOutput() const;
+    static QJsonObject request(const QString& command, const QVariant& params);
 
-private:
-    ListeningProcess process;
+    bool serve(const QStringList& arguments = {},
+               const QProcessEnvironment& environment = QProcessEnvironment::systemEnvironment());
+    // Sends every request at once, each on a connection of its own, and returns the answers in
+    // the same order.
+    QList<Answer> post(const QList<QJsonObject>& requests) const;
 };

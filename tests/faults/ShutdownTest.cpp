@@ -31,36 +31,38 @@ TEST(ShutdownTest, DestroyedPluginHasAnsweredItsCameraWorkAndAnswersNothingLater
     const auto& commands = cameraCommands();
     for (int i = 0; i < CAMERA_OPERATIONS; ++i) {
         const CameraCommand& command = commands.at(i % commands.size());
-        plugin->Request(command.name, command.to(camsim.host(), camsim.port(), "admin", "admin"),
-                        RequestSenderInfo(), ledger.callback(i));
+        plugin->Request(command.name, command.to(camsim.port()), RequestSenderInfo(),
+                        ledger.callback(i));
     }
-    for (int i = 0; i < RULE_REQUESTS; ++i) {
-        const int id = CAMERA_OPERATIONS + i;
+    for (int i = CAMERA_OPERATIONS; i < CAMERA_OPERATIONS + RULE_REQUESTS; ++i) {
         if (i % 2 == 0)
             plugin->Request("retrieveVcaRawRuleInfo", "cam1", RequestSenderInfo(),
-                            ledger.callback(id));
+                            ledger.callback(i));
         else
             plugin->Request("getRecordingVCARule",
                             QVariantMap{{"locationIDs", QStringList{"lobby"}}, {"timestamp", 1}},
-                            RequestSenderInfo(), ledger.callback(id));
+                            RequestSenderInfo(), ledger.callback(i));
     }
     // Some are on the wire, the rest queued in the client.
     ASSERT_TRUE(runEventLoopUntil([&camsim] { return camsim.logLines().size() >= 4; }, 10000));
     ASSERT_EQ(tools.channel.count(), RULE_REQUESTS);
 
     plugin.reset();
-    ledger.close();
+    const int answeredBeforeGone = ledger.calls();
     // The host answers the rule requests only now, and queued work gets its turn.
     for (int i = 0; i < RULE_REQUESTS; ++i)
         tools.channel.reply(i, true, QString(), "vca", "0", "<GetVCARulesRes/>", true);
     QCoreApplication::processEvents();
 
-    EXPECT_EQ(ledger.late(), 0);
-    EXPECT_EQ(ledger.answeredTwice(), 0);
-    // Camera work is given up as failed while the plugin goes.
-    for (int i = 0; i < CAMERA_OPERATIONS; ++i) {
+    EXPECT_EQ(ledger.calls(), answeredBeforeGone);
+    // Camera work is given up as failed while the plugin goes; rule requests at most once.
+    for (int i = 0; i < CAMERA_OPERATIONS + RULE_REQUESTS; ++i) {
         const AnswerLedger::Entry answer = ledger.entry(i);
-        ASSERT_EQ(answer.calls, 1) << commands.at(i % commands.size()).name;
-        ASSERT_EQ(answer.code, "-1") << commands.at(i % commands.size()).name;
+        if (i >= CAMERA_OPERATIONS) {
+            ASSERT_LE(answer.calls, 1) << "rule request " << i;
+        } else {
+            ASSERT_EQ(answer.calls, 1) << commands.at(i % commands.size()).name;
+            ASSERT_EQ(answer.first.code, "-1") << commands.at(i % commands.size()).name;
+        }
     }
 }

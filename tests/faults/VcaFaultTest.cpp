@@ -92,10 +92,11 @@ TEST(VcaFaultTest, EveryRuleRequestIsAnsweredOnceWithTheFailureResult) {
         SCOPED_TRACE(c.name);
         const AnswerLedger::Entry answer = ledger.entry(id++);
         EXPECT_EQ(answer.calls, 1);
-        EXPECT_EQ(answer.handled, c.handled);
-        EXPECT_EQ(answer.code, c.code);
-        EXPECT_EQ(answer.message, "");
-        EXPECT_TRUE(c.payloadFits(answer.payload)) << qPrintable(answer.payload.toString());
+        EXPECT_EQ(answer.first.handled, c.handled);
+        EXPECT_EQ(answer.first.code, c.code);
+        EXPECT_EQ(answer.first.message, "");
+        EXPECT_TRUE(c.payloadFits(answer.first.payload))
+            << qPrintable(answer.first.payload.toString());
         // The host's timer is a coarse one, which may fire up to 5 % early.
         if (c.waitsForDeadline)
             EXPECT_GE(answer.elapsedMs, HOST_DEADLINE_MS * 95 / 100 - 100);
