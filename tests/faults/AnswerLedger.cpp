@@ -17,7 +17,12 @@ ResponseCallback AnswerLedger::callback(int id) {
         ++shared->calls;
         Entry& entry = shared->entries[id];
         if (entry.calls++ == 0)
-            entry = Entry{1, shared->clock.elapsed(), {handled, code, message, payload}};
+            entry = Entry{1,
+                          shared->clock.elapsed(),
+                          {{"handled", handled},
+                           {"code", code},
+                           {"message", message},
+                           {"payload", QJsonValue::fromVariant(payload)}}};
     };
 }
 

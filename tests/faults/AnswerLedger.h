@@ -1,8 +1,9 @@
 #pragma once
 
-#include "ResponseRecorder.h"
+#include "PluginFramework.h"
 
 #include <QElapsedTimer>
+#include <QJsonObject>
 
 #include <map>
 #include <memory>
@@ -15,7 +16,7 @@ public:
     struct Entry {
         int calls = 0;
         qint64 elapsedMs = -1; // from the ledger's creation to the first answer
-        ResponseRecorder::Response first;
+        QJsonObject first;     // handled, code, message and payload
     };
 
     AnswerLedger();

@@ -1,6 +1,7 @@
 // Every camera command against a camera that fails in each way a transport can, through
 // quenvar-host and through the plugin in this process: each is answered once, promptly, with the
-// failure result, and the host stays up and ends without a leak.
+// failure result, and the host stays up and ends without a leak. No trace, log or answer gives
+// the password away, whether the camera took it, refused it or was never reached.
 #include "AnswerLedger.h"
 #include "CameraCommands.h"
 #include "CamsimProcess.h"
@@ -13,17 +14,20 @@
 #include <QTcpServer>
 #include <QTcpSocket>
 #include <QTemporaryDir>
+#include <QUrl>
 
 #include <gtest/gtest.h>
 
 #include <memory>
 #include <ostream>
+#include <vector>
 
 namespace {
 
 // The proxy's deadline for a camera request, and how soon any other failure must be answered.
 const qint64 DEADLINE_MS = 10000;
 const qint64 PROMPT_MS = 5000;
+const QString SECRET = QStringLiteral("Pw-7hQ2zX:secret");
 
 // Refusing and Garbled cameras are played by this process; Tls is the simulator with a
 // self-signed certificate.
@@ -32,7 +36,7 @@ enum class Camera { Simulated, Refusing, Garbled, Tls };
 struct FaultCase {
     const char* name;
     Camera camera;
-    QStringList camsimArguments = {};
+    const char* camsimArguments = "";
     bool waitsForDeadline = false;
 };
 
@@ -77,7 +81,9 @@ protected:
                 return 0;
             arguments << "--tls-cert" << cert << "--tls-key" << key;
         }
-        camsim = std::make_unique<CamsimProcess>(arguments);
+        // Faults come after authentication, so most cases take the password.
+        camsim = std::make_unique<CamsimProcess>(
+            QStringList{"--auth", "digest", "--user", "admin", "--pass", SECRET} + arguments);
         return camsim->port();
     }
 
@@ -90,10 +96,13 @@ protected:
 
 TEST_P(CameraFaultTest, EveryCommandIsAnsweredOnceWithTheFailureResult) {
     const FaultCase& c = GetParam();
-    const quint16 port = startCamera(c.camera, c.camsimArguments);
+    const quint16 port =
+        startCamera(c.camera, QString(c.camsimArguments).split(' ', Qt::SkipEmptyParts));
     ASSERT_NE(port, 0);
+    QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
+    environment.insert("QT_LOGGING_RULES", "qt.network.*=true");
     ServedHost host;
-    ASSERT_TRUE(host.serve());
+    ASSERT_TRUE(host.serve({"--verbose"}, environment));
     // The same requests in this process too, where the answers can be counted.
     FakeFrameworkTools tools;
     auto plugin = std::make_unique<PluginQuenvar>();
@@ -101,7 +110,7 @@ TEST_P(CameraFaultTest, EveryCommandIsAnsweredOnceWithTheFailureResult) {
     AnswerLedger ledger;
     QList<QJsonObject> requests;
     for (const CameraCommand& command : cameraCommands()) {
-        const QVariantMap params = command.to(port, "admin", c.camera == Camera::Tls);
+        const QVariantMap params = command.to(port, SECRET, c.camera == Camera::Tls);
         plugin->Request(command.name, params, RequestSenderInfo(),
                         ledger.callback(static_cast<int>(requests.size())));
         requests.append(ServedHost::request(command.name, params));
@@ -111,19 +120,17 @@ TEST_P(CameraFaultTest, EveryCommandIsAnsweredOnceWithTheFailureResult) {
     ASSERT_TRUE(ledger.waitForAll(DEADLINE_MS + PROMPT_MS));
     plugin.reset();
 
+    QString everything;
     for (int i = 0; i < static_cast<int>(answers.size()); ++i) {
         const CameraCommand& command = cameraCommands().at(i);
         SCOPED_TRACE(command.name);
         const AnswerLedger::Entry counted = ledger.entry(i);
-        EXPECT_EQ(answers.at(i).status, 200);
         EXPECT_EQ(counted.calls, 1);
-        const QJsonObject inProcess{{"handled", counted.first.handled},
-                                    {"code", counted.first.code},
-                                    {"message", counted.first.message},
-                                    {"payload", QJsonValue::fromVariant(counted.first.payload)}};
-        for (const QJsonObject& answer : {answers.at(i).json, inProcess}) {
+        const ServedHost::Answer inProcess{200, counted.first, counted.elapsedMs};
+        for (const ServedHost::Answer& answer : {answers.at(i), inProcess}) {
+            EXPECT_EQ(answer.status, 200);
             // Undefined: any text.
-            const QJsonValue payload = answer.value("payload");
+            const QJsonValue payload = answer.json.value("payload");
             const QJsonObject expected{
                 {"handled", true},
                 {"code", "-1"},
@@ -131,31 +138,35 @@ TEST_P(CameraFaultTest, EveryCommandIsAnsweredOnceWithTheFailureResult) {
                 {"payload", command.failurePayload.isUndefined() && payload.isString()
                                 ? payload
                                 : command.failurePayload}};
-            EXPECT_EQ(text(answer), text(expected));
-        }
-        for (const qint64 elapsedMs : {answers.at(i).elapsedMs, counted.elapsedMs}) {
-            EXPECT_LT(elapsedMs, c.waitsForDeadline ? DEADLINE_MS + PROMPT_MS : PROMPT_MS);
-            EXPECT_GE(elapsedMs, c.waitsForDeadline ? DEADLINE_MS - 500 : 0);
+            everything += QString::fromStdString(text(answer.json));
+            EXPECT_EQ(text(answer.json), text(expected));
+            EXPECT_LT(answer.elapsedMs, c.waitsForDeadline ? DEADLINE_MS + PROMPT_MS : PROMPT_MS);
+            EXPECT_GE(answer.elapsedMs, c.waitsForDeadline ? DEADLINE_MS - 500 : 0);
         }
     }
     EXPECT_EQ(host.stop(), 0) << qPrintable(host.errorOutput());
+    everything += host.errorOutput();
+    for (const std::string& line : camsim ? camsim->logLines() : std::vector<std::string>())
+        everything += QString::fromStdString(line);
+    // The traces did run.
+    EXPECT_TRUE(everything.contains("PluginQuenvar::Request")) << qPrintable(everything);
+    for (const QString& form : {SECRET, QString::fromLatin1(QUrl::toPercentEncoding(SECRET)),
+                                QString::fromLatin1(("admin:" + SECRET).toUtf8().toBase64())})
+        EXPECT_FALSE(everything.contains(form)) << qPrintable(form);
 }
 
 INSTANTIATE_TEST_SUITE_P(
     Faults, CameraFaultTest,
     ::testing::Values(
         FaultCase{"ConnectionRefused", Camera::Refusing},
-        FaultCase{"ResetMidAnswer", Camera::Simulated, {"--fault", "close"}},
-        FaultCase{"NoAnswerUntilTheDeadline",
-                  Camera::Simulated,
-                  {"--fault", "delay", "--fault-delay-ms", "30000"},
-                  true},
-        FaultCase{"WrongCredentials",
-                  Camera::Simulated,
-                  {"--auth", "digest", "--user", "admin", "--pass", "the-right-one"}},
-        FaultCase{"NotFound", Camera::Simulated, {"--fault", "status", "--fault-status", "404"}},
-        FaultCase{"ServerError", Camera::Simulated, {"--fault", "status", "--fault-status", "500"}},
+        FaultCase{"ResetMidAnswer", Camera::Simulated, "--fault close"},
+        FaultCase{"NoAnswerUntilTheDeadline", Camera::Simulated,
+                  "--fault delay --fault-delay-ms 30000", true},
+        FaultCase{"WrongCredentials", Camera::Simulated, "--pass the-right-one"},
+        FaultCase{"WrongBasicCredentials", Camera::Simulated, "--auth basic --pass x"},
+        FaultCase{"NotFound", Camera::Simulated, "--fault status --fault-status 404"},
+        FaultCase{"ServerError", Camera::Simulated, "--fault status --fault-status 500"},
         FaultCase{"MalformedAnswer", Camera::Garbled},
-        FaultCase{"OversizedAnswer", Camera::Simulated, {"--fault", "oversize"}},
+        FaultCase{"OversizedAnswer", Camera::Simulated, "--fault oversize"},
         FaultCase{"UntrustedCertificate", Camera::Tls}),
     [](const ::testing::TestParamInfo<FaultCase>& info) { return info.param.name; });

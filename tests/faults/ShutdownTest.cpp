@@ -35,13 +35,11 @@ TEST(ShutdownTest, DestroyedPluginHasAnsweredItsCameraWorkAndAnswersNothingLater
                         ledger.callback(i));
     }
     for (int i = CAMERA_OPERATIONS; i < CAMERA_OPERATIONS + RULE_REQUESTS; ++i) {
-        if (i % 2 == 0)
-            plugin->Request("retrieveVcaRawRuleInfo", "cam1", RequestSenderInfo(),
-                            ledger.callback(i));
-        else
-            plugin->Request("getRecordingVCARule",
-                            QVariantMap{{"locationIDs", QStringList{"lobby"}}, {"timestamp", 1}},
-                            RequestSenderInfo(), ledger.callback(i));
+        const bool live = i % 2 == 0;
+        plugin->Request(live ? "retrieveVcaRawRuleInfo" : "getRecordingVCARule",
+                        live ? QVariant("cam1")
+                             : QVariantMap{{"locationIDs", QStringList{"lobby"}}, {"timestamp", 1}},
+                        RequestSenderInfo(), ledger.callback(i));
     }
     // Some are on the wire, the rest queued in the client.
     ASSERT_TRUE(runEventLoopUntil([&camsim] { return camsim.logLines().size() >= 4; }, 10000));
@@ -62,7 +60,8 @@ TEST(ShutdownTest, DestroyedPluginHasAnsweredItsCameraWorkAndAnswersNothingLater
             ASSERT_LE(answer.calls, 1) << "rule request " << i;
         } else {
             ASSERT_EQ(answer.calls, 1) << commands.at(i % commands.size()).name;
-            ASSERT_EQ(answer.first.code, "-1") << commands.at(i % commands.size()).name;
+            ASSERT_EQ(answer.first["code"].toString(), "-1")
+                << commands.at(i % commands.size()).name;
         }
     }
 }

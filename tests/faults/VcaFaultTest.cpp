@@ -1,15 +1,13 @@
 // Rule requests to a VCA plugin that never answers, answers garbage or answers twice, through
 // the host's request channel: each client is answered exactly once, with the failure result.
 #include "AnswerLedger.h"
-#include "FaultyVcaPlugin.h"
 #include "PluginHost.h"
 #include "PluginQuenvar.h"
 
 #include <QJsonArray>
+#include <QJsonDocument>
 
 #include <gtest/gtest.h>
-
-#include <functional>
 
 namespace {
 
@@ -18,8 +16,47 @@ const QString VCA_ID = QStringLiteral("2F4484ECD91046658F567F2B3B0FDAFD");
 // The wait that the plugin asks of the host for a rule request.
 const qint64 HOST_DEADLINE_MS = 15000;
 const qint64 PROMPT_MS = 5000;
-const QString EMPTY_XML_RULES =
-    QStringLiteral("<?xml version='1.0' encoding='UTF-8'?><Rules></Rules>");
+
+// Misbehaves as the request asks: an identifier holding "silent" is never answered, "garbage" is
+// answered with text that is no XML, and "twice" twice, for "first" and then for "second".
+class FaultyVcaPlugin : public IPluginObjectBase {
+    Q_OBJECT
+
+public:
+    bool InitialPluginBase(IFrameworkTools*) override { return true; }
+    void Request(const QString& command, const QVariant& params, const RequestSenderInfo&,
+                 ResponseCallback callback) override {
+        const QString content = params.toString();
+        const QString reply =
+            command == "GetVCARules"
+                ? "<GetVCARulesRes><Camera><CamName>%1</CamName><Rules Format=\"json\">"
+                  "<Rule Type=\"Intrusion\" Name=\"Door\">{}</Rule></Rules></Camera>"
+                  "</GetVCARulesRes>"
+                : "<GetRecordingVCARulesRes><Location><LocName>%1</LocName>"
+                  "<JsonRules>{}</JsonRules></Location></GetRecordingVCARulesRes>";
+        if (content.contains("silent")) {
+            unanswered.append(callback);
+        } else if (content.contains("garbage")) {
+            callback(true, "0", QString(),
+                     "<GetVCARulesRes><Camera><CamName>cam</CamName><Rules Format=\"json\">"
+                     "<Rule Type=\"&bogus;\" Name=\"%zz\">{not json\x01</Rule><![CDATA[\xff");
+        } else if (content.contains("twice")) {
+            callback(true, "0", QString(), reply.arg("first"));
+            callback(true, "0", QString(), reply.arg("second"));
+        }
+    }
+    void RequestBlock(const QString&, const QVariant&, const RequestSenderInfo&,
+                      IResponser&) override {}
+    void SubscribeEventBlock(const QString&, const QString&, const QVariant&,
+                             const RequestSenderInfo&, IResponser&) override {}
+    void UnsubscribeEventBlock(const QString&, const QVariant&, IResponser&) override {}
+
+signals:
+    void vcaMetadataChanged(const QString& cameraID);
+
+private:
+    QList<ResponseCallback> unanswered;
+};
 
 QJsonObject metaData(const QString& id, const QStringList& commands = {}) {
     return {{"IID", QUENVAR_PLUGIN_INTERFACE_IID},
@@ -27,43 +64,39 @@ QJsonObject metaData(const QString& id, const QStringList& commands = {}) {
              QJsonObject{{"PluginID", id}, {"Commands", QJsonArray::fromStringList(commands)}}}};
 }
 
-struct VcaCase {
-    const char* name;
-    QString command;
-    QVariant params;
-    bool handled;
-    QString code;
-    std::function<bool(const QVariant&)> payloadFits;
-    bool waitsForDeadline = false;
-};
-
 QVariant recordingParams(const QString& location) {
     return QVariantMap{{"locationIDs", QStringList{location}}, {"timestamp", 1700000000}};
 }
 
+struct VcaCase {
+    const char* name;
+    QString command;
+    QVariant params;
+    QString answer; // as compact JSON; a final * stands for any rest
+    bool waitsForDeadline = false;
+};
+
+const QString LIVE = QStringLiteral("retrieveVcaRawRuleInfo");
+const QString RECORDING = QStringLiteral("getRecordingVCARule");
 const VcaCase CASES[] = {
-    {"LiveNeverAnswered", "retrieveVcaRawRuleInfo", "silent", false, "-1",
-     [](const QVariant& payload) {
-         return payload == QVariantMap{{"camID", ""},
-                                       {"isJSON", false},
-                                       {"relayPath", ""},
-                                       {"rules", EMPTY_XML_RULES}};
-     },
+    {"LiveNeverAnswered", LIVE, "silent",
+     R"({"code":"-1","handled":false,"message":"","payload":{"camID":"","isJSON":false,)"
+     R"("relayPath":"","rules":"<?xml version='1.0' encoding='UTF-8'?><Rules></Rules>"}})",
      true},
-    {"LiveAnsweredWithGarbage", "retrieveVcaRawRuleInfo", "garbage", true, "0",
-     [](const QVariant& payload) {
-         const QVariantMap map = payload.toMap();
-         return map.value("isJSON") == false && map.value("relayPath") == VCA_ID &&
-                map.value("rules").toString().startsWith("<?xml");
-     }},
-    {"LiveAnsweredTwice", "retrieveVcaRawRuleInfo", "twice", true, "0",
-     [](const QVariant& payload) { return payload.toMap().value("camID") == "first"; }},
-    {"RecordingNeverAnswered", "getRecordingVCARule", recordingParams("silent"), false, "-1",
-     [](const QVariant& payload) { return !payload.isValid(); }, true},
-    {"RecordingAnsweredWithGarbage", "getRecordingVCARule", recordingParams("garbage"), true, "-1",
-     [](const QVariant& payload) { return !payload.isValid(); }},
-    {"RecordingAnsweredTwice", "getRecordingVCARule", recordingParams("twice"), true, "0",
-     [](const QVariant& payload) { return payload.toMap().keys() == QStringList{"first"}; }},
+    {"LiveAnsweredWithGarbage", LIVE, "garbage",
+     R"({"code":"0","handled":true,"message":"","payload":{"camID":"cam","isJSON":false,)"
+     R"("relayPath":"2F4484ECD91046658F567F2B3B0FDAFD","rules":"<?xml*)"},
+    {"LiveAnsweredTwice", LIVE, "twice",
+     R"({"code":"0","handled":true,"message":"","payload":{"camID":"first","isJSON":true,)"
+     R"("relayPath":"2F4484ECD91046658F567F2B3B0FDAFD",)"
+     R"("rules":"{\"Intrusion\":{\"Door\":{}}}"}})"},
+    {"RecordingNeverAnswered", RECORDING, recordingParams("silent"),
+     R"({"code":"-1","handled":false,"message":"","payload":null})", true},
+    {"RecordingAnsweredWithGarbage", RECORDING, recordingParams("garbage"),
+     R"({"code":"-1","handled":true,"message":"","payload":null})"},
+    {"RecordingAnsweredTwice", RECORDING, recordingParams("twice"),
+     R"({"code":"0","handled":true,"message":"","payload":{"first":{"analysisEngine":"{}",)"
+     R"("isJSON":true,"projection":"{}","vcaRules":"{}"}}})"},
 };
 
 } // namespace
@@ -92,11 +125,11 @@ TEST(VcaFaultTest, EveryRuleRequestIsAnsweredOnceWithTheFailureResult) {
         SCOPED_TRACE(c.name);
         const AnswerLedger::Entry answer = ledger.entry(id++);
         EXPECT_EQ(answer.calls, 1);
-        EXPECT_EQ(answer.first.handled, c.handled);
-        EXPECT_EQ(answer.first.code, c.code);
-        EXPECT_EQ(answer.first.message, "");
-        EXPECT_TRUE(c.payloadFits(answer.first.payload))
-            << qPrintable(answer.first.payload.toString());
+        const QString text = QJsonDocument(answer.first).toJson(QJsonDocument::Compact);
+        if (c.answer.endsWith('*'))
+            EXPECT_TRUE(text.startsWith(c.answer.chopped(1))) << qPrintable(text);
+        else
+            EXPECT_EQ(text, c.answer);
         // The host's timer is a coarse one, which may fire up to 5 % early.
         if (c.waitsForDeadline)
             EXPECT_GE(answer.elapsedMs, HOST_DEADLINE_MS * 95 / 100 - 100);
@@ -104,3 +137,5 @@ TEST(VcaFaultTest, EveryRuleRequestIsAnsweredOnceWithTheFailureResult) {
             EXPECT_LT(answer.elapsedMs, PROMPT_MS);
     }
 }
+
+#include "VcaFaultTest.moc"
