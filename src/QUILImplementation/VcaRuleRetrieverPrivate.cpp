@@ -1,16 +1,16 @@
 #include "QUILImplementation/VcaRuleRetrieverPrivate.h"
 
 #include "PluginQuenvarDefs.h"
+#include "QUILImplementation/JsonNormaliser.h"
 #include "TraceLog.h"
 #include "Trindle.h"
 
 #include <QByteArray>
-#include <QJsonDocument>
-#include <QJsonValue>
 #include <QRegularExpression>
 #include <QUrl>
 
 #include <exception>
+#include <optional>
 
 namespace {
 
@@ -44,10 +44,6 @@ const QString JSON_RULES = QStringLiteral("JsonRules");
 const QString PROJECTION = QStringLiteral("Projection");
 const QString ANALYSIS_ENGINE = QStringLiteral("AnalysisEngine");
 const QString JSON_FORMAT = QStringLiteral("json");
-
-// A rule's text is read as the value of this member, so that its name needs no escaping.
-const QString WRAP_KEY = QStringLiteral("v");
-const QByteArray WRAP_OPEN = QByteArrayLiteral("{\"v\":");
 
 const QString XML_DECLARATION = QStringLiteral("<?xml version='1.0' encoding='UTF-8'?>");
 const QString EMPTY_RULES = QStringLiteral("<Rules></Rules>");
@@ -251,20 +247,18 @@ void VcaRuleRetriever::VcaRuleRetrieverPrivate::convertJsonRules(const QVariant&
     result.insert(VCA_KEY_RELAY_PATH, relayPath);
     result.insert(VCA_KEY_IS_JSON, true);
 
-    QMap<QString, QJsonObject> rulesByType;
-    QByteArray wrapped;
+    RulesByType rulesByType;
     for (const QVariant& entry : rules) {
         const QVariantMap rule = entry.toMap();
         const QString name = percentDecoded(rule.value(NAME_ATTRIBUTE).toString());
-        const QByteArray text = rule.value(TEXT).toString().toUtf8();
-        wrapped.resize(0);
-        wrapped.append(WRAP_OPEN).append(text).append('}');
-        const QJsonValue value = QJsonDocument::fromJson(wrapped).object().value(WRAP_KEY);
-        QJsonObject& rulesOfType = rulesByType[rule.value(TYPE_ATTRIBUTE).toString()];
-        if (value.isUndefined())
-            rulesOfType.remove(name);
+        // The text is read as the member "v" of a wrapper object, so the name needs no escaping.
+        const std::optional<QByteArray> value =
+            JsonNormaliser::wrappedValue(rule.value(TEXT).toString().toUtf8());
+        QMap<QString, QByteArray>& rulesOfType = rulesByType[rule.value(TYPE_ATTRIBUTE).toString()];
+        if (value)
+            rulesOfType.insert(name, *value);
         else
-            rulesOfType.insert(name, value);
+            rulesOfType.remove(name);
     }
     result.insert(VCA_KEY_RULES, rulesToJsonText(rulesByType));
 }
@@ -293,12 +287,25 @@ void VcaRuleRetriever::VcaRuleRetrieverPrivate::convertXmlRules(const QString& r
     result.insert(VCA_KEY_RULES, XML_DECLARATION + (copy.isEmpty() ? EMPTY_RULES : copy));
 }
 
-QString VcaRuleRetriever::VcaRuleRetrieverPrivate::rulesToJsonText(
-    const QMap<QString, QJsonObject>& rulesByType) {
-    QJsonObject root;
-    for (auto it = rulesByType.constBegin(); it != rulesByType.constEnd(); ++it)
-        root.insert(it.key(), it.value());
-    return QString::fromUtf8(QJsonDocument(root).toJson(QJsonDocument::Compact));
+QString VcaRuleRetriever::VcaRuleRetrieverPrivate::rulesToJsonText(const RulesByType& rulesByType) {
+    QByteArray json;
+    json.append('{');
+    for (auto type = rulesByType.constBegin(); type != rulesByType.constEnd(); ++type) {
+        if (type != rulesByType.constBegin())
+            json.append(',');
+        JsonNormaliser::appendString(json, type.key());
+        json.append(":{");
+        const QMap<QString, QByteArray>& rulesOfType = type.value();
+        for (auto rule = rulesOfType.constBegin(); rule != rulesOfType.constEnd(); ++rule) {
+            if (rule != rulesOfType.constBegin())
+                json.append(',');
+            JsonNormaliser::appendString(json, rule.key());
+            json.append(':').append(rule.value());
+        }
+        json.append('}');
+    }
+    json.append('}');
+    return QString::fromUtf8(json);
 }
 
 QVariant

@@ -2,7 +2,7 @@
 
 #include "QUILImplementation/VcaRuleRetriever.h"
 
-#include <QJsonObject>
+#include <QByteArray>
 #include <QList>
 #include <QMap>
 #include <QString>
@@ -38,7 +38,10 @@ public:
                                  QVariantMap& result);
     static void convertXmlRules(const QString& replyText, const QString& relayPath,
                                 QVariantMap& result);
-    static QString rulesToJsonText(const QMap<QString, QJsonObject>& rulesByType);
+    // Rule type to the compact JSON text of each rule of that type, by name; both in Qt's order
+    // of JSON keys, which is QString's.
+    using RulesByType = QMap<QString, QMap<QString, QByteArray>>;
+    static QString rulesToJsonText(const RulesByType& rulesByType);
 
     // Recording reply to the result map, by location name; invalid when the text is not XML.
     static QVariant convertRecordingReply(const QString& replyText);

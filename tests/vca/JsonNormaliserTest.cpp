@@ -1,0 +1,123 @@
+#include "QUILImplementation/JsonNormaliser.h"
+
+#include "QUILImplementation/VcaRuleRetrieverPrivate.h"
+
+#include <QJsonArray>
+#include <QJsonDocument>
+#include <QJsonObject>
+
+#include <gtest/gtest.h>
+
+namespace {
+
+// What Qt's own round trip makes of {"v":TEXT}: the reference the normaliser must match.
+std::optional<QByteArray> byQt(const QByteArray& text) {
+    const QJsonValue value =
+        QJsonDocument::fromJson("{\"v\":" + text + "}").object().value(QLatin1String("v"));
+    if (value.isUndefined())
+        return std::nullopt;
+    const QByteArray array = QJsonDocument(QJsonArray{value}).toJson(QJsonDocument::Compact);
+    return array.mid(1, array.size() - 2);
+}
+
+class JsonNormaliserTest : public testing::TestWithParam<const char*> {};
+
+TEST_P(JsonNormaliserTest, WritesWhatQtsRoundTripWrites) {
+    const QByteArray text(GetParam());
+    const std::optional<QByteArray> expected = byQt(text);
+    const std::optional<QByteArray> actual = JsonNormaliser::wrappedValue(text);
+    ASSERT_EQ(actual.has_value(), expected.has_value());
+    if (expected) {
+        EXPECT_EQ(actual->toStdString(), expected->toStdString());
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Texts, JsonNormaliserTest,
+    testing::Values(
+        // Structure: key order, the last of equal keys, nesting, empty containers.
+        R"({"b":1,"a":{"d":[1,{"z":0,"y":1}],"c":null},"b":2})", R"({"a":1,"a":2,"a":3})",
+        R"({"a":{"b":1},"a":{"c":2}})", R"([[],{},[{}],""])", R"( { "x" : [ true , false ] } )",
+        R"({"b":1,"a":2,"c":3,"a":4,"b":5})", R"({"\u0061":1,"a":2})", R"({"":1,"\u0000":2})",
+        // The wrapper: a later "v", other members, scalars, trailing garbage, truncation.
+        R"(1,"v":2)", R"(1,"w":2)", R"("x","v":{"b":1,"a":2},"u":3)", "true", "null", "\"s\"",
+        R"(1}{"a":2)", "", " ", "{", "[1,2", "[1,]", "{\"a\":1,}", "nul", "tru",
+        // Numbers as Qt reads and writes them.
+        "[0,-0,1,-1,123456789012345678,-123456789012345678]",
+        "[1234567890123456789,9223372036854775807,9223372036854775808,-9223372036854775808]",
+        "[-9223372036854775809,18446744073709551615,123456789012345678901234567890]",
+        "[1.0,1.5,-0.0,0.0,1e2,1E+2,1e-2,0.1,0.0001,1e-7,1e15,1e16,1e21,1.5e300,-1e300]",
+        "[9007199254740993,9007199254740993.0,12345678901234567.5,4.9e-324,0e0,-0e0]",
+        "[1.7976931348623157e308,2.2250738585072014e-308,123456.789,9.2233720368547758e18]",
+        "[1e400]", "[1e-400]", "[1.]", "[01]", "[-]", "[.5]", "[+1]", "[1e]", "[0x10]", "[NaN]",
+        "[Infinity]",
+        // Strings: escapes in, Qt's escapes out, Unicode kept as UTF-8.
+        R"(["\u0000\u001f\u007f\b\f\n\r\t\"\\\/"])",
+        "[\"\x7f\xc3\xa9\xe2\x82\xac\xf0\x9f\x98\x80\"]", R"(["\ud83d\ude00","\u00e9\u20ac"])",
+        R"(["\ud800"])", R"(["\udc00x"])", R"(["\a\q"])", "[\"raw\ttab\"]", "[\"line\nbreak\"]",
+        "[\"\xc3\"]", "[\"\xed\xa0\x80\"]",
+        // Keys beyond the BMP, whose order in Qt depends on how the key was stored.
+        "{\"\xef\xbf\xbf\":1,\"\xf0\x90\x80\x80\":2}", R"({"\uffff":1,"\ud800\udc00":2})",
+        "{\"\xf0\x90\x80\x80\":1,\"\\uffff\":2}",
+        // Invalid literals and an embedded NUL.
+        "[truth]", "[nulll]", "[False]"));
+
+TEST(JsonNormaliserDepthTest, DeepTextsAgreeWithQtOnBothSidesOfItsLimit) {
+    for (const int depth : {500, 1022, 1023, 1024, 5000}) {
+        const QByteArray text = QByteArray(depth, '[') + QByteArray(depth, ']');
+        const std::optional<QByteArray> expected = byQt(text);
+        const std::optional<QByteArray> actual = JsonNormaliser::wrappedValue(text);
+        ASSERT_EQ(actual.has_value(), expected.has_value()) << depth;
+        if (expected) {
+            EXPECT_EQ(*actual, *expected) << depth;
+        }
+    }
+}
+
+TEST(JsonNormaliserTest, EmbeddedNulIsReadAsQtReadsIt) {
+    const QByteArray text("1}\0{\"a\":2", 9);
+    EXPECT_EQ(JsonNormaliser::wrappedValue(text), byQt(text));
+}
+
+TEST(JsonNormaliserStringTest, EscapesAsQtsWriter) {
+    const QString texts[] = {
+        QStringLiteral("plain"),
+        QString::fromUtf8("\"\\/\b\f\n\r\t\x01\x1f\x7f"),
+        QString(QChar(0)),
+        QString::fromUtf8("\xc3\xa9\xe2\x82\xac\xef\xbf\xbf\xf0\x9f\x98\x80"),
+        QString(QChar(0xd800)) + QLatin1Char('x'),
+        QString(QChar(0xdc00)),
+        QString(QChar(0xd83d)),
+        QString(QChar(0xd83d)) + QChar(0xd83d) + QChar(0xde00),
+    };
+    for (const QString& text : texts) {
+        QByteArray actual;
+        JsonNormaliser::appendString(actual, text);
+        const QByteArray array = QJsonDocument(QJsonArray{text}).toJson(QJsonDocument::Compact);
+        EXPECT_EQ(actual, array.mid(1, array.size() - 2)) << text.toStdString();
+    }
+}
+
+// Types and names in the order and escaping of a QJsonObject, also beyond the BMP.
+TEST(JsonNormaliserStringTest, RulesTextIsWhatQtWritesForTheSameMap) {
+    const QString names[] = {QStringLiteral("b"), QString(QChar(0xffff)),
+                             QString::fromUtf8("\xf0\x90\x80\x80"), QStringLiteral("a\"q\\\n"),
+                             QString()};
+    VcaRuleRetriever::VcaRuleRetrieverPrivate::RulesByType rules;
+    QJsonObject expected;
+    for (const QString& type : names) {
+        QJsonObject ofType;
+        QMap<QString, QByteArray>& ours = rules[type];
+        for (const QString& name : names) {
+            ofType.insert(name, name.size());
+            ours.insert(name, QByteArray::number(name.size()));
+        }
+        expected.insert(type, ofType);
+    }
+    rules.insert(QStringLiteral("empty"), {});
+    expected.insert(QStringLiteral("empty"), QJsonObject());
+    EXPECT_EQ(VcaRuleRetriever::VcaRuleRetrieverPrivate::rulesToJsonText(rules),
+              QString::fromUtf8(QJsonDocument(expected).toJson(QJsonDocument::Compact)));
+}
+
+} // namespace
