@@ -20,7 +20,9 @@
 // taken as already percent-encoded. User name and password answer the server's Basic or Digest
 // challenge, once per request, and serve no other request; they never go into the URL or the log.
 // Headers are "Name: value" strings. Only http and https are served; redirects are followed
-// within the same scheme, host and port only, and no cookies are kept.
+// within the same scheme, host and port only, and no cookies are kept. Requests go over kept-alive
+// HTTP/1.1 connections, at most 16 to one scheme, host and port; the others wait their turn, in
+// order, under their deadlines.
 #pragma once
 
 #include "ISimpleHTTPClient.h"

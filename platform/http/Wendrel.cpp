@@ -8,6 +8,9 @@
 #include <QMutexLocker>
 #include <QThread>
 
+#include <memory>
+#include <vector>
+
 namespace {
 
 WendrelRequest makeRequest(const QByteArray& method, const QUrl& url, const QByteArray& body,
@@ -62,8 +65,8 @@ public:
 
     ~WendrelPrivate() {
         {
-            QMutexLocker lock(&mutex);
-            accepting = false;
+            QMutexLocker lock(&incoming->mutex);
+            incoming->accepting = false;
         }
         if (QThread::currentThread() == thread) {
             // Destroyed from a reply callback: the thread cannot wait for itself, so the
@@ -84,22 +87,38 @@ public:
     WendrelPrivate(const WendrelPrivate&) = delete;
     WendrelPrivate& operator=(const WendrelPrivate&) = delete;
 
+    // Requests gather here and go to the worker in batches, one wake-up of its thread per batch:
+    // under load, most requests start from reply callbacks, many of them per turn of its loop.
     bool submit(WendrelRequest request) {
-        QMutexLocker lock(&mutex);
-        if (!accepting)
+        QMutexLocker lock(&incoming->mutex);
+        if (!incoming->accepting)
             return false;
-        QMetaObject::invokeMethod(
-            worker,
-            [worker = worker, request = std::move(request)]() mutable {
-                worker->start(std::move(request));
-            },
-            Qt::QueuedConnection);
+        const bool first = incoming->requests.empty();
+        incoming->requests.push_back(std::move(request));
+        if (first)
+            QMetaObject::invokeMethod(
+                worker,
+                [worker = worker, incoming = incoming] {
+                    std::vector<WendrelRequest> batch;
+                    {
+                        QMutexLocker lock(&incoming->mutex);
+                        batch.swap(incoming->requests);
+                    }
+                    for (WendrelRequest& request : batch)
+                        worker->start(std::move(request));
+                },
+                Qt::QueuedConnection);
         return true;
     }
 
 private:
-    QMutex mutex;
-    bool accepting = true; // guarded by mutex, so that nothing is queued behind the shutdown
+    struct Incoming {
+        QMutex mutex;
+        bool accepting = true; // so that nothing is queued behind the shutdown
+        std::vector<WendrelRequest> requests;
+    };
+
+    const std::shared_ptr<Incoming> incoming = std::make_shared<Incoming>();
     QThread* thread;
     WendrelWorker* worker;
 };

@@ -1,5 +1,7 @@
 #include "WendrelUrl.h"
 
+#include <algorithm>
+
 namespace {
 
 bool isHexDigit(QChar c) {
@@ -27,21 +29,36 @@ QString escapeStrays(const QString& pathWithQuery) {
     return result;
 }
 
+// A DNS name or an IPv4 address, which can stand in the URL's text as it is.
+bool isPlainHost(const QString& host) {
+    return !host.isEmpty() && std::all_of(host.begin(), host.end(), [](QChar c) {
+        return (c.unicode() < 128 && c.isLetterOrNumber()) || c == QLatin1Char('.') ||
+               c == QLatin1Char('-');
+    });
+}
+
 } // namespace
 
 QUrl WendrelUrl::fromParts(const QString& host, quint16 port, bool useSSL,
                            const QString& pathWithQuery) {
-    QUrl origin;
-    origin.setScheme(useSSL ? QStringLiteral("https") : QStringLiteral("http"));
-    origin.setHost(host);
-    if (port != 0)
-        origin.setPort(port);
+    QString origin;
+    if (isPlainHost(host)) {
+        origin = (useSSL ? QLatin1String("https://") : QLatin1String("http://")) + host;
+        if (port != 0)
+            origin += QLatin1Char(':') + QString::number(port);
+    } else {
+        QUrl url;
+        url.setScheme(useSSL ? QStringLiteral("https") : QStringLiteral("http"));
+        url.setHost(host);
+        if (port != 0)
+            url.setPort(port);
+        origin = url.toString(QUrl::FullyEncoded);
+    }
     // The setters for path and query would encode "%" a second time; parsing the whole URL
     // keeps valid escapes as they are.
     const QString separator =
         pathWithQuery.startsWith(QLatin1Char('/')) ? QString() : QStringLiteral("/");
-    return QUrl(origin.toString(QUrl::FullyEncoded) + separator + escapeStrays(pathWithQuery),
-                QUrl::TolerantMode);
+    return QUrl(origin + separator + escapeStrays(pathWithQuery), QUrl::TolerantMode);
 }
 
 QUrl WendrelUrl::fromText(const QString& url) {

@@ -6,23 +6,81 @@
 #include "WendrelUrl.h"
 
 #include <QCoreApplication>
-#include <QNetworkAccessManager>
 #include <QSslCertificate>
-#include <QtGlobal>
-#if QT_VERSION >= QT_VERSION_CHECK(6, 5, 0)
-#include <QHttp1Configuration>
-#endif
 
 #include <algorithm>
 #include <climits>
+#include <utility>
 #include <vector>
 
 namespace {
 
-QString originOf(const QUrl& url) {
-    const bool tls = url.scheme() == QLatin1String("https");
-    return url.scheme() + QLatin1Char(' ') + url.host() + QLatin1Char(' ') +
+QString originOf(const QString& scheme, const QString& host, const QUrl& url) {
+    const bool tls = scheme == QLatin1String("https");
+    return scheme + QLatin1Char(' ') + host + QLatin1Char(' ') +
            QString::number(url.port(tls ? 443 : 80));
+}
+
+QString originOf(const QUrl& url) {
+    return originOf(url.scheme(), url.host(), url);
+}
+
+// Headers the request line and body settle.
+bool framingHeader(const QByteArray& name) {
+    for (const char* framing : {"Host", "Content-Length", "Transfer-Encoding", "Connection"}) {
+        if (name.compare(framing, Qt::CaseInsensitive) == 0)
+            return true;
+    }
+    return false;
+}
+
+QByteArray hostHeader(const QUrl& url) {
+    QByteArray host = url.host(QUrl::FullyEncoded).toLatin1();
+    if (host.contains(':'))
+        host = '[' + host + ']';
+    const int port = url.port();
+    const int defaultPort = url.scheme() == QLatin1String("https") ? 443 : 80;
+    if (port != -1 && port != defaultPort)
+        host += ':' + QByteArray::number(port);
+    return host;
+}
+
+// As Qt maps HTTP statuses of 400 and above.
+QNetworkReply::NetworkError statusError(int status) {
+    switch (status) {
+    case 400:
+    case 418:
+        return QNetworkReply::ProtocolInvalidOperationError;
+    case 401:
+        return QNetworkReply::AuthenticationRequiredError;
+    case 403:
+        return QNetworkReply::ContentAccessDenied;
+    case 404:
+        return QNetworkReply::ContentNotFoundError;
+    case 405:
+        return QNetworkReply::ContentOperationNotPermittedError;
+    case 407:
+        return QNetworkReply::ProxyAuthenticationRequiredError;
+    case 409:
+        return QNetworkReply::ContentConflictError;
+    case 410:
+        return QNetworkReply::ContentGoneError;
+    case 500:
+        return QNetworkReply::InternalServerError;
+    case 501:
+        return QNetworkReply::OperationNotImplementedError;
+    case 503:
+        return QNetworkReply::ServiceUnavailableError;
+    default:
+        if (status > 500)
+            return QNetworkReply::UnknownServerError;
+        return status >= 400 ? QNetworkReply::UnknownContentError : QNetworkReply::NoError;
+    }
+}
+
+bool isRedirect(int status) {
+    return status == 301 || status == 302 || status == 303 || status == 305 || status == 307 ||
+           status == 308;
 }
 
 // Bearer requests carry their token and answer no challenge.
@@ -49,11 +107,13 @@ void WendrelWorker::start(WendrelRequest request) {
         answer(request.callback, QNetworkReply::OperationCanceledError, {}, {}, false);
         return;
     }
-    if (request.url.host().isEmpty()) {
+    const QString host = request.url.host();
+    const QString scheme = request.url.scheme();
+    if (host.isEmpty()) {
         answer(request.callback, QNetworkReply::HostNotFoundError, {}, {}, false);
         return;
     }
-    if (!WendrelUrl::isHttp(request.url)) {
+    if (scheme != QLatin1String("http") && scheme != QLatin1String("https")) {
         answer(request.callback, QNetworkReply::ProtocolUnknownError, {}, {}, false);
         return;
     }
@@ -64,19 +124,17 @@ void WendrelWorker::start(WendrelRequest request) {
 
     const Id id = nextId++;
     Pending& entry = pending[id];
-    entry.origin = originOf(request.url);
+    entry.origin = originOf(scheme, host, request.url);
+    entry.slot = &origins[entry.origin];
     entry.deadline = request.deadline ? deadlines.emplace(*request.deadline, id) : deadlines.end();
     entry.request = std::move(request);
     if (entry.deadline != deadlines.end() && entry.deadline == deadlines.begin())
         armDeadlineTimer();
 
-    Origin& origin = origins[entry.origin];
-    if (origin.active < activePerOrigin) {
-        ++origin.active;
+    if (hasRoom(*entry.slot))
         launch(id, {});
-    } else {
-        origin.waiting.push_back(id);
-    }
+    else
+        entry.slot->waiting.push_back(id);
 }
 
 void WendrelWorker::shutdown() {
@@ -91,20 +149,11 @@ void WendrelWorker::shutdown() {
     for (const Id id : ids)
         abortRequest(id, QNetworkReply::OperationCanceledError);
     deadlineTimer.stop();
-    // Shutdown may run inside one of the manager's own signals: it goes when the thread ends.
-    if (network)
-        network->deleteLater();
-    network = nullptr;
-}
-
-QNetworkAccessManager* WendrelWorker::manager() {
-    if (!network) {
-        network = new QNetworkAccessManager(this);
-        // Credentials are per request: never follow a redirect to another origin with them.
-        network->setRedirectPolicy(QNetworkRequest::SameOriginRedirectPolicy);
-        connect(network, &QNetworkAccessManager::finished, this, &WendrelWorker::finish);
+    for (auto& origin : origins) {
+        for (WendrelConnection* connection : origin.second.idle)
+            connection->close();
+        origin.second.idle.clear();
     }
-    return network;
 }
 
 const std::optional<QSslConfiguration>& WendrelWorker::tlsConfiguration() {
@@ -128,136 +177,139 @@ const std::optional<QSslConfiguration>& WendrelWorker::tlsConfiguration() {
     return sslConfiguration;
 }
 
-QNetworkRequest WendrelWorker::networkRequest(const WendrelRequest& request) {
-    QNetworkRequest result(request.url);
-    // Nothing carries over from one request to the next: Qt neither sends nor caches
-    // credentials of its own (WendrelAuth answers challenges), and keeps no cookies.
-    result.setAttribute(QNetworkRequest::AuthenticationReuseAttribute, QNetworkRequest::Manual);
-    result.setAttribute(QNetworkRequest::CookieLoadControlAttribute, QNetworkRequest::Manual);
-    result.setAttribute(QNetworkRequest::CookieSaveControlAttribute, QNetworkRequest::Manual);
-#if QT_VERSION >= QT_VERSION_CHECK(6, 5, 0)
-    QHttp1Configuration http1;
-    http1.setNumberOfConnectionsPerHost(connectionsPerOrigin);
-    result.setHttp1Configuration(http1);
-#endif
+// The whole request. Nothing carries over from one request to the next: no credentials but the
+// request's own (WendrelAuth answers challenges), and no cookies.
+QByteArray WendrelWorker::message(const Pending& entry, const QByteArray& authorization) {
+    const WendrelRequest& request = entry.request;
+    const QByteArray target = WendrelAuth::target(request.url);
+    QByteArray result;
+    result.reserve(256 + request.body.size());
+    result.append(request.method).append(' ').append(target).append(" HTTP/1.1\r\nHost: ");
+    result.append(hostHeader(request.url)).append("\r\n");
     for (const QString& header : request.headers) {
         const qsizetype colon = header.indexOf(QLatin1Char(':'));
-        if (colon > 0)
-            result.setRawHeader(header.left(colon).trimmed().toLatin1(),
-                                header.mid(colon + 1).trimmed().toLatin1());
+        const QByteArray name = header.left(colon).trimmed().toLatin1();
+        if (colon > 0 && !framingHeader(name))
+            result.append(name)
+                .append(": ")
+                .append(header.mid(colon + 1).trimmed().toLatin1())
+                .append("\r\n");
     }
     if (!request.contentType.isEmpty())
-        result.setHeader(QNetworkRequest::ContentTypeHeader, request.contentType);
-    if (request.bearer)
-        result.setRawHeader("Authorization", "Bearer " + request.password.toUtf8());
-    if (request.url.scheme() == QLatin1String("https") && tlsConfiguration())
-        result.setSslConfiguration(*tlsConfiguration());
+        result.append("Content-Type: ").append(request.contentType.toLatin1()).append("\r\n");
+    if (request.bearer) {
+        result.append("Authorization: Bearer ").append(request.password.toUtf8()).append("\r\n");
+    } else {
+        const QByteArray sent = authorization.isEmpty() && hasCredentials(request)
+                                    ? authentication.before(entry.origin, request.method, target,
+                                                            request.user, request.password)
+                                    : authorization;
+        if (!sent.isEmpty())
+            result.append("Authorization: ").append(sent).append("\r\n");
+    }
+    if (!request.body.isEmpty() || (request.method != "GET" && request.method != "HEAD"))
+        result.append("Content-Length: ")
+            .append(QByteArray::number(request.body.size()))
+            .append("\r\n");
+    result.append("\r\n").append(request.body);
     return result;
+}
+
+bool WendrelWorker::hasRoom(const Origin& origin) {
+    return !origin.idle.empty() || origin.open < connectionsPerOrigin;
 }
 
 void WendrelWorker::launch(Id id, const QByteArray& authorization) {
     Pending& entry = pending.at(id);
-    const WendrelRequest& request = entry.request;
-    QNetworkAccessManager* network = manager();
-    QNetworkRequest message = networkRequest(request);
-    const QByteArray sentAuthorization =
-        authorization.isEmpty() && hasCredentials(request)
-            ? authentication.before(entry.origin, request.method, WendrelAuth::target(request.url),
-                                    request.user, request.password)
-            : authorization;
-    if (!sentAuthorization.isEmpty())
-        message.setRawHeader("Authorization", sentAuthorization);
-    QNetworkReply* reply = nullptr;
-    if (request.method == "GET")
-        reply = network->get(message);
-    else if (request.method == "POST")
-        reply = network->post(message, request.body);
-    else if (request.method == "PUT")
-        reply = network->put(message, request.body);
-    else
-        reply = network->sendCustomRequest(message, request.method, request.body);
-    entry.reply = reply;
-    replies.emplace(reply, id);
-
-    connect(reply, &QNetworkReply::readyRead, this, [this, reply] { checkBodySize(reply); });
-    connect(reply, &QNetworkReply::requestSent, this, [this, reply] {
-        const auto found = replies.find(reply);
-        if (found != replies.end())
-            pending.at(found->second).reachedServer = true;
-    });
-    // Qt may report some failures before the reply is handed out; finish() skipped it then.
-    if (reply->isFinished())
-        finish(reply);
+    Origin& origin = *entry.slot;
+    WendrelConnection* connection = nullptr;
+    if (!origin.idle.empty()) {
+        connection = origin.idle.back();
+        origin.idle.pop_back();
+    } else {
+        const QUrl& url = entry.request.url;
+        const bool https = url.scheme() == QLatin1String("https");
+        connection = new WendrelConnection(
+            url.host(), quint16(url.port(https ? 443 : 80)), https,
+            https ? tlsConfiguration() : std::nullopt, maxBodySize,
+            [this, slot = entry.slot](WendrelConnection* gone) { dropped(*slot, gone); }, this);
+        ++origin.open;
+    }
+    entry.connection = connection;
+    connection->send(message(entry, authorization),
+                     [this, id](WendrelConnection* ended, WendrelConnection::Answer answer) {
+                         exchangeEnded(id, ended, std::move(answer));
+                     });
 }
 
-void WendrelWorker::launchWaiting(const QString& originKey) {
-    // A launch can finish at once and come back here: the outer loop carries on instead.
+void WendrelWorker::launchWaiting(Origin& origin) {
+    // A launch can end at once and come back here: the outer loop carries on instead.
     if (launching)
         return;
     launching = true;
     const Clock::time_point now = Clock::now();
-    while (!closing) {
-        const auto found = origins.find(originKey);
-        if (found == origins.end())
-            break;
-        Origin& origin = found.value();
-        if (origin.waiting.empty()) {
-            if (origin.active == 0)
-                origins.erase(found);
-            break;
-        }
-        if (origin.active >= activePerOrigin)
-            break;
+    while (!closing && !origin.waiting.empty() && hasRoom(origin)) {
         const Id id = origin.waiting.front();
         origin.waiting.pop_front();
         const auto entry = pending.find(id);
         if (entry == pending.end())
             continue;
-        // One whose deadline passed while it waited is left to expireDeadlines, unsent: when a
-        // whole queue expires together, launching each only to abort it would pile up replies
-        // that are deleted only after the last of them, and delay every answer behind them.
+        // One whose deadline passed while it waited is left to expireDeadlines, unsent.
         const Deadlines::iterator deadline = entry->second.deadline;
         if (deadline != deadlines.end() && deadline->first <= now)
             continue;
-        ++origin.active;
         launch(id, {});
     }
     launching = false;
 }
 
-void WendrelWorker::finish(QNetworkReply* reply) {
-    const auto found = replies.find(reply);
-    if (found == replies.end())
-        return;
-    const Id id = found->second;
-    replies.erase(found);
-    reply->deleteLater();
+void WendrelWorker::exchangeEnded(Id id, WendrelConnection* connection,
+                                  WendrelConnection::Answer answer) {
     Pending& entry = pending.at(id);
-    entry.reply = nullptr;
+    entry.connection = nullptr;
+    Origin& origin = *entry.slot;
+    release(origin, connection);
 
-    const bool aborted = entry.abortedWith != QNetworkReply::NoError;
-    if (!aborted && reply->error() == QNetworkReply::AuthenticationRequiredError &&
-        answerChallenge(id, reply))
+    // A kept-alive connection that the server had closed in the meantime: once more on a new
+    // one, as browsers and Qt do.
+    if (answer.error != QNetworkReply::NoError && !answer.answerBegan && answer.connectionReused &&
+        !entry.resent && !closing) {
+        entry.resent = true;
+        launch(id, {});
         return;
-
-    entry.reachedServer =
-        entry.reachedServer || reply->attribute(QNetworkRequest::HttpStatusCodeAttribute).isValid();
-    QByteArray headers;
-    for (const QNetworkReply::RawHeaderPair& header : reply->rawHeaderPairs())
-        headers += header.first + ": " + header.second + "\r\n";
-    const QString origin = entry.origin;
-    complete(id, aborted ? entry.abortedWith : reply->error(), headers,
-             aborted ? QByteArray() : reply->readAll());
-
-    const auto slot = origins.find(origin);
-    if (slot != origins.end())
-        --slot.value().active;
+    }
+    if (answer.error == QNetworkReply::NoError && !closing) {
+        if (answer.status == 401 && answerChallenge(id, answer.challenges))
+            return;
+        if (isRedirect(answer.status) && !answer.location.isEmpty() && followRedirect(id, answer))
+            return;
+    }
+    const QNetworkReply::NetworkError error =
+        answer.error != QNetworkReply::NoError ? answer.error : statusError(answer.status);
+    complete(id, error, answer.headers, answer.body, answer.reachedServer);
     launchWaiting(origin);
 }
 
-// Sends the request again with an answer to the challenge in reply: once, so that rejected
-// credentials end the request with AuthenticationRequiredError.
-bool WendrelWorker::answerChallenge(Id id, QNetworkReply* reply) {
+void WendrelWorker::release(Origin& origin, WendrelConnection* connection) {
+    if (connection->reusable() && !closing) {
+        origin.idle.push_back(connection);
+    } else {
+        connection->close();
+        --origin.open;
+    }
+}
+
+void WendrelWorker::dropped(Origin& origin, WendrelConnection* connection) {
+    connection->close();
+    origin.idle.erase(std::remove(origin.idle.begin(), origin.idle.end(), connection),
+                      origin.idle.end());
+    --origin.open;
+    launchWaiting(origin);
+}
+
+// Sends the request again with an answer to the challenge: once, so that rejected credentials
+// end the request with AuthenticationRequiredError.
+bool WendrelWorker::answerChallenge(Id id, const QByteArray& challenges) {
     Pending& entry = pending.at(id);
     const WendrelRequest& request = entry.request;
     if (!hasCredentials(request))
@@ -267,7 +319,7 @@ bool WendrelWorker::answerChallenge(Id id, QNetworkReply* reply) {
         return false;
     }
     const QByteArray authorization =
-        authentication.answer(entry.origin, reply->rawHeader("WWW-Authenticate"), request.method,
+        authentication.answer(entry.origin, challenges, request.method,
                               WendrelAuth::target(request.url), request.user, request.password);
     if (authorization.isEmpty())
         return false;
@@ -276,39 +328,64 @@ bool WendrelWorker::answerChallenge(Id id, QNetworkReply* reply) {
     return true;
 }
 
+// Follows a redirect to the same scheme, host and port, with the same credentials; ends the
+// request when it leads elsewhere or too far.
+bool WendrelWorker::followRedirect(Id id, const WendrelConnection::Answer& answer) {
+    Pending& entry = pending.at(id);
+    const QUrl target = entry.request.url.resolved(QUrl::fromEncoded(answer.location));
+    QNetworkReply::NetworkError refusal = QNetworkReply::NoError;
+    if (!target.isValid() || !WendrelUrl::isHttp(target))
+        refusal = QNetworkReply::ProtocolFailure;
+    else if (originOf(target) != entry.origin)
+        refusal = QNetworkReply::InsecureRedirectError;
+    else if (++entry.redirects > maxRedirects)
+        refusal = QNetworkReply::TooManyRedirectsError;
+    if (refusal != QNetworkReply::NoError) {
+        Origin& origin = *entry.slot;
+        complete(id, refusal, answer.headers, answer.body, answer.reachedServer);
+        launchWaiting(origin);
+        return true;
+    }
+    WendrelRequest& request = entry.request;
+    if (answer.status == 303 ||
+        ((answer.status == 301 || answer.status == 302) && request.method == "POST")) {
+        request.method = "GET";
+        request.body.clear();
+        request.contentType.clear();
+    }
+    request.url = target;
+    entry.challengeAnswered = false;
+    launch(id, {});
+    return true;
+}
+
 void WendrelWorker::abortRequest(Id id, QNetworkReply::NetworkError reason) {
     const auto found = pending.find(id);
     if (found == pending.end())
         return;
     Pending& entry = found->second;
-    if (!entry.reply) {
+    WendrelConnection* connection = std::exchange(entry.connection, nullptr);
+    if (!connection) {
         // Still waiting for its turn: its place in the queue is skipped later.
-        complete(id, reason, {}, {});
+        complete(id, reason, {}, {}, false);
         return;
     }
-    entry.abortedWith = reason;
-    QNetworkReply* reply = entry.reply;
-    reply->abort();
-    // abort() reports through finished; this covers a reply that had no more to report.
-    finish(reply);
+    Origin& origin = *entry.slot;
+    const bool reachedServer = connection->reachedServer();
+    connection->close();
+    --origin.open;
+    complete(id, reason, {}, {}, reachedServer);
+    launchWaiting(origin);
 }
 
 void WendrelWorker::complete(Id id, QNetworkReply::NetworkError error, const QByteArray& headers,
-                             const QByteArray& body) {
+                             const QByteArray& body, bool reachedServer) {
     const auto found = pending.find(id);
     Pending entry = std::move(found->second);
     pending.erase(found);
     if (entry.deadline != deadlines.end())
         deadlines.erase(entry.deadline);
-    answer(entry.request.callback, error, headers, body, entry.reachedServer);
-}
-
-void WendrelWorker::checkBodySize(QNetworkReply* reply) {
-    if (reply->bytesAvailable() <= maxBodySize)
-        return;
-    const auto found = replies.find(reply);
-    if (found != replies.end())
-        abortRequest(found->second, QNetworkReply::UnknownContentError);
+    answer(entry.request.callback, error, headers, body, reachedServer);
 }
 
 void WendrelWorker::expireDeadlines() {

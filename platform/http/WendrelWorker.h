@@ -1,9 +1,9 @@
 #pragma once
 
 #include "WendrelAuth.h"
+#include "WendrelConnection.h"
 #include "WendrelRequest.h"
 
-#include <QHash>
 #include <QNetworkReply>
 #include <QObject>
 #include <QSslConfiguration>
@@ -14,77 +14,71 @@
 #include <map>
 #include <optional>
 #include <unordered_map>
+#include <vector>
 
-class QNetworkAccessManager;
 struct WendrelTlsSettings;
 
-// Lives on Wendrel's worker thread and runs every request there, with one network access
-// manager and one deadline timer for all of them. Every member function except the constructor
-// runs on that thread; nothing here is locked.
-//
-// Qt keeps a reply for every request it is given, and a reply costs far more memory than the
-// request itself; Qt only sends a few at a time to one server anyway. So at most
-// activePerOrigin requests per scheme, host and port are handed to Qt, and the others wait
-// here, in order, under the same deadlines.
+// Lives on Wendrel's worker thread and runs every request there, over its own keep-alive
+// connections (at most connectionsPerOrigin per scheme, host and port) and one deadline timer for
+// all of them. Requests beyond the connections wait here, in order, under the same deadlines.
+// Every member function except the constructor runs on that thread; nothing here is locked.
 class WendrelWorker : public QObject {
 public:
     explicit WendrelWorker(const WendrelTlsSettings& tls);
 
     void start(WendrelRequest request);
-    // Answers everything queued or in flight with OperationCanceledError and releases the
-    // manager; requests that arrive later are answered the same way without being sent.
+    // Answers everything queued or in flight with OperationCanceledError and closes every
+    // connection; requests that arrive later are answered the same way without being sent.
     void shutdown();
 
     static constexpr qint64 maxBodySize = 8 * 1024 * 1024;
-    // Connections Qt opens to one server; before Qt 6.5 its fixed default.
-#if QT_VERSION >= QT_VERSION_CHECK(6, 5, 0)
+    // Enough to keep a camera busy under load, few enough for a small server.
     static constexpr int connectionsPerOrigin = 16;
-#else
-    static constexpr int connectionsPerOrigin = 6;
-#endif
-    // Two per connection: Qt starts the next as soon as an answer ends, and no more wait inside
-    // Qt, where a waiting request costs about twenty times what it costs here.
-    static constexpr int activePerOrigin = 2 * connectionsPerOrigin;
+    // Qt's limit.
+    static constexpr int maxRedirects = 50;
 
 private:
     using Clock = WendrelRequest::Clock;
     using Id = quint64;
     using Deadlines = std::multimap<Clock::time_point, Id>;
 
+    struct Origin;
     struct Pending {
-        WendrelRequest request; // kept for the answer to an authentication challenge
+        WendrelRequest request; // kept for the answer to a challenge, a redirect or a resend
         QString origin;
-        QNetworkReply* reply = nullptr; // none while waiting for its turn
+        Origin* slot = nullptr;
+        WendrelConnection* connection = nullptr; // none while waiting for its turn
         bool challengeAnswered = false;
-        bool reachedServer = false;
-        // Set when we abort the reply, to report why instead of Qt's OperationCanceledError.
-        QNetworkReply::NetworkError abortedWith = QNetworkReply::NoError;
+        bool resent = false;
+        int redirects = 0;
         Deadlines::iterator deadline;
     };
 
     struct Origin {
-        int active = 0;
+        int open = 0; // connections, carrying an exchange or idle
+        std::vector<WendrelConnection*> idle;
         std::deque<Id> waiting; // may hold ids already answered; they are skipped
     };
 
-    QNetworkAccessManager* manager();
     const std::optional<QSslConfiguration>& tlsConfiguration();
-    QNetworkRequest networkRequest(const WendrelRequest& request);
+    QByteArray message(const Pending& entry, const QByteArray& authorization);
+    static bool hasRoom(const Origin& origin);
     void launch(Id id, const QByteArray& authorization);
-    void launchWaiting(const QString& origin);
-    void finish(QNetworkReply* reply);
-    bool answerChallenge(Id id, QNetworkReply* reply);
+    void launchWaiting(Origin& origin);
+    void exchangeEnded(Id id, WendrelConnection* connection, WendrelConnection::Answer answer);
+    void release(Origin& origin, WendrelConnection* connection);
+    void dropped(Origin& origin, WendrelConnection* connection);
+    bool answerChallenge(Id id, const QByteArray& challenges);
+    bool followRedirect(Id id, const WendrelConnection::Answer& answer);
     void abortRequest(Id id, QNetworkReply::NetworkError reason);
     void complete(Id id, QNetworkReply::NetworkError error, const QByteArray& headers,
-                  const QByteArray& body);
-    void checkBodySize(QNetworkReply* reply);
+                  const QByteArray& body, bool reachedServer);
     void expireDeadlines();
     void armDeadlineTimer();
     static void answer(const HttpReplyCallback& callback, QNetworkReply::NetworkError error,
                        const QByteArray& headers, const QByteArray& body, bool reachedServer);
 
     bool closing = false;
-    QNetworkAccessManager* network = nullptr;
     WendrelAuth authentication;
     QString caFile;
     bool insecure = false;
@@ -95,6 +89,6 @@ private:
     bool launching = false;
     Id nextId = 0;
     std::unordered_map<Id, Pending> pending;
-    std::unordered_map<QNetworkReply*, Id> replies;
-    QHash<QString, Origin> origins;
+    // Kept while the worker lives, so that requests and connections can point at theirs.
+    std::unordered_map<QString, Origin> origins;
 };

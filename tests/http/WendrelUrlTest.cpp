@@ -16,6 +16,8 @@ TEST(WendrelUrlTest, FormsTheUrlFromItsParts) {
         {"cam", 0, true, "/a", "https://cam/a"},
         {"10.0.0.7", 8080, false, "/a?b", "http://10.0.0.7:8080/a?b"},
         {"::1", 443, true, "/a", "https://[::1]:443/a"},
+        {"Cam-2.Example", 0, false, "/a", "http://cam-2.example/a"},
+        {"caf\xc3\xa9", 0, false, "/a", "http://xn--caf-dma/a"},
         // Already encoded: escapes and delimiters pass unchanged.
         {"cam", 0, false, "/c.cgi?a=%26&b=%3D&c=%25&d=x&e=y",
          "http://cam/c.cgi?a=%26&b=%3D&c=%25&d=x&e=y"},
