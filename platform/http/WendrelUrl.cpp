@@ -12,19 +12,28 @@ bool isHexDigit(QChar c) {
 
 // QUrl takes a text with one stray "%" as wholly unencoded and encodes every "%" again; a "#"
 // would start a fragment, which is never sent. Both are escaped here, valid escapes are kept.
+bool isStray(const QString& text, qsizetype i) {
+    const QChar c = text.at(i);
+    return c == QLatin1Char('#') ||
+           (c == QLatin1Char('%') &&
+            !(i + 2 < text.size() && isHexDigit(text.at(i + 1)) && isHexDigit(text.at(i + 2))));
+}
+
 QString escapeStrays(const QString& pathWithQuery) {
-    QString result;
-    result.reserve(pathWithQuery.size());
-    for (qsizetype i = 0; i < pathWithQuery.size(); ++i) {
-        const QChar c = pathWithQuery.at(i);
-        if (c == QLatin1Char('#'))
+    qsizetype first = 0;
+    while (first < pathWithQuery.size() && !isStray(pathWithQuery, first))
+        ++first;
+    if (first == pathWithQuery.size())
+        return pathWithQuery;
+    QString result = pathWithQuery.left(first);
+    result.reserve(pathWithQuery.size() + 8);
+    for (qsizetype i = first; i < pathWithQuery.size(); ++i) {
+        if (!isStray(pathWithQuery, i))
+            result += pathWithQuery.at(i);
+        else if (pathWithQuery.at(i) == QLatin1Char('#'))
             result += QLatin1String("%23");
-        else if (c == QLatin1Char('%') &&
-                 !(i + 2 < pathWithQuery.size() && isHexDigit(pathWithQuery.at(i + 1)) &&
-                   isHexDigit(pathWithQuery.at(i + 2))))
-            result += QLatin1String("%25");
         else
-            result += c;
+            result += QLatin1String("%25");
     }
     return result;
 }

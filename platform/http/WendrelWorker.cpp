@@ -125,6 +125,7 @@ void WendrelWorker::start(WendrelRequest request) {
     const Id id = nextId++;
     Pending& entry = pending[id];
     entry.origin = originOf(scheme, host, request.url);
+    entry.hostHeader = hostHeader(request.url);
     entry.slot = &origins[entry.origin];
     entry.deadline = request.deadline ? deadlines.emplace(*request.deadline, id) : deadlines.end();
     entry.request = std::move(request);
@@ -185,7 +186,7 @@ QByteArray WendrelWorker::message(const Pending& entry, const QByteArray& author
     QByteArray result;
     result.reserve(256 + request.body.size());
     result.append(request.method).append(' ').append(target).append(" HTTP/1.1\r\nHost: ");
-    result.append(hostHeader(request.url)).append("\r\n");
+    result.append(entry.hostHeader).append("\r\n");
     for (const QString& header : request.headers) {
         const qsizetype colon = header.indexOf(QLatin1Char(':'));
         const QByteArray name = header.left(colon).trimmed().toLatin1();
