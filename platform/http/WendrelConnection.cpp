@@ -74,7 +74,8 @@ WendrelConnection::WendrelConnection(const QString& host, quint16 port, bool htt
             if (auto* ssl = qobject_cast<QSslSocket*>(socket))
                 ssl->connectToHostEncrypted(host, port);
             else
-                socket->connectToHost(host, port);
+                // Unbuffered: written at once, read straight from the socket.
+                socket->connectToHost(host, port, QIODevice::ReadWrite | QIODevice::Unbuffered);
         },
         Qt::QueuedConnection);
 }
@@ -110,6 +111,8 @@ void WendrelConnection::write(const QByteArray& message) {
     const bool queued = socket->write(message) == message.size();
     socket->flush();
     writing = false;
+    if (queued && socket->bytesToWrite() == 0)
+        answer.reachedServer = true;
     if (!queued || failedWhileWriting)
         QMetaObject::invokeMethod(
             this,
@@ -129,13 +132,17 @@ void WendrelConnection::connected() {
 
 void WendrelConnection::read() {
     const QByteArray data = socket->readAll();
+    // An unbuffered socket that reads the end of its input says so only through its state.
+    const bool ended = socket->state() == QAbstractSocket::UnconnectedState;
     if (!finished) {
         // Nothing may arrive between exchanges.
-        if (!data.isEmpty() && dropped)
+        if ((!data.isEmpty() || ended) && dropped)
             dropped(this);
         return;
     }
     feed(data.constData(), data.size());
+    if (ended && finished)
+        endOfInput();
 }
 
 void WendrelConnection::written(qint64 bytes) {
@@ -210,7 +217,7 @@ void WendrelConnection::feed(const char* data, qsizetype size) {
 }
 
 void WendrelConnection::finish(QNetworkReply::NetworkError error) {
-    if (error != QNetworkReply::NoError)
+    if (error != QNetworkReply::NoError || socket->state() != QAbstractSocket::ConnectedState)
         keepAlive = false;
     answer.error = error;
     ++exchanges;
