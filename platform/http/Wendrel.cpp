@@ -4,11 +4,10 @@
 #include "WendrelUrl.h"
 #include "WendrelWorker.h"
 
-#include <QMutex>
-#include <QMutexLocker>
 #include <QThread>
 
 #include <memory>
+#include <mutex>
 #include <vector>
 
 namespace {
@@ -65,7 +64,7 @@ public:
 
     ~WendrelPrivate() {
         {
-            QMutexLocker lock(&incoming->mutex);
+            std::lock_guard<std::mutex> lock(incoming->mutex);
             incoming->accepting = false;
         }
         if (QThread::currentThread() == thread) {
@@ -90,7 +89,7 @@ public:
     // Requests gather here and go to the worker in batches, one wake-up of its thread per batch:
     // under load, most requests start from reply callbacks, many of them per turn of its loop.
     bool submit(WendrelRequest request) {
-        QMutexLocker lock(&incoming->mutex);
+        std::lock_guard<std::mutex> lock(incoming->mutex);
         if (!incoming->accepting)
             return false;
         const bool first = incoming->requests.empty();
@@ -101,7 +100,7 @@ public:
                 [worker = worker, incoming = incoming] {
                     std::vector<WendrelRequest> batch;
                     {
-                        QMutexLocker lock(&incoming->mutex);
+                        std::lock_guard<std::mutex> lock(incoming->mutex);
                         batch.swap(incoming->requests);
                     }
                     for (WendrelRequest& request : batch)
@@ -113,7 +112,7 @@ public:
 
 private:
     struct Incoming {
-        QMutex mutex;
+        std::mutex mutex;
         bool accepting = true; // so that nothing is queued behind the shutdown
         std::vector<WendrelRequest> requests;
     };

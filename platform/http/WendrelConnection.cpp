@@ -116,8 +116,9 @@ void WendrelConnection::write(const QByteArray& message) {
     if (!queued || failedWhileWriting)
         QMetaObject::invokeMethod(
             this,
-            [this, error = failedWhileWriting ? failedWith : QNetworkReply::RemoteHostClosedError] {
-                if (finished)
+            [this, exchange = exchanges,
+             error = failedWhileWriting ? failedWith : QNetworkReply::RemoteHostClosedError] {
+                if (finished && exchanges == exchange)
                     finish(error);
             },
             Qt::QueuedConnection);

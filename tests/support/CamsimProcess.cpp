@@ -1,6 +1,7 @@
 #include "CamsimProcess.h"
 
 #include "BuildPaths.h"
+#include "ChildProcess.h"
 
 #include <QDeadlineTimer>
 #include <QEventLoop>
@@ -20,6 +21,7 @@ const int CONTROL_TIMEOUT_MS = 3000;
 
 CamsimProcess::CamsimProcess(const QStringList& arguments) {
     process.setProcessChannelMode(QProcess::ForwardedErrorChannel);
+    endWithTestProcess(process);
     process.start(BuildPaths::bin(QStringLiteral("quenvar-camsim")),
                   QStringList{QStringLiteral("--listen"), host() + QStringLiteral(":0"),
                               QStringLiteral("--log"),

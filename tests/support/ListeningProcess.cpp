@@ -1,5 +1,7 @@
 #include "ListeningProcess.h"
 
+#include "ChildProcess.h"
+
 #include <QCoreApplication>
 #include <QDeadlineTimer>
 #include <QFile>
@@ -19,6 +21,7 @@ bool ListeningProcess::start(const QString& program, const QStringList& argument
                              const QProcessEnvironment& environment) {
     process.setProcessEnvironment(environment);
     process.setStandardErrorFile(folder.filePath(QStringLiteral("stderr.log")));
+    endWithTestProcess(process);
     process.start(program, arguments);
     if (!process.waitForStarted(START_TIMEOUT_MS))
         return false;
