@@ -24,9 +24,9 @@ public:
         QByteArray headers;    // "Name: value\r\n" for each header line
         QByteArray challenges; // the WWW-Authenticate values, joined by commas
         QByteArray location;
-        QByteArray body;            // as much as arrived, also on failure
-        bool reachedServer = false; // the request went out whole, or an answer came back
-        bool answerBegan = false;
+        QByteArray body;               // as much as arrived, also on failure
+        bool reachedServer = false;    // the request went out whole, or an answer came back
+        bool answerBegan = false;      // some of an answer arrived
         bool connectionReused = false; // an earlier exchange had ended on the connection
     };
     // The end of one exchange, reported once; never after close().

@@ -243,11 +243,8 @@ void WendrelWorker::launch(Id id, const QByteArray& authorization) {
                      });
 }
 
+// A launch never ends inside the call: connections report from the event loop.
 void WendrelWorker::launchWaiting(Origin& origin) {
-    // A launch can end at once and come back here: the outer loop carries on instead.
-    if (launching)
-        return;
-    launching = true;
     const Clock::time_point now = Clock::now();
     while (!closing && !origin.waiting.empty() && hasRoom(origin)) {
         const Id id = origin.waiting.front();
@@ -261,7 +258,6 @@ void WendrelWorker::launchWaiting(Origin& origin) {
             continue;
         launch(id, {});
     }
-    launching = false;
 }
 
 void WendrelWorker::exchangeEnded(Id id, WendrelConnection* connection,

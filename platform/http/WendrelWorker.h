@@ -87,7 +87,6 @@ private:
     std::optional<QSslConfiguration> sslConfiguration; // made on first use: loading roots is slow
     QTimer deadlineTimer;
     Deadlines deadlines;
-    bool launching = false;
     Id nextId = 0;
     std::unordered_map<Id, Pending> pending;
     // Kept while the worker lives, so that requests and connections can point at theirs.
