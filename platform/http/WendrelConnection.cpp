@@ -71,6 +71,8 @@ WendrelConnection::WendrelConnection(const QString& host, quint16 port, bool htt
     QMetaObject::invokeMethod(
         this,
         [this, host, port] {
+            if (closed)
+                return;
             if (auto* ssl = qobject_cast<QSslSocket*>(socket))
                 ssl->connectToHostEncrypted(host, port);
             else
@@ -97,6 +99,7 @@ void WendrelConnection::send(const QByteArray& message, Finished done) {
 }
 
 void WendrelConnection::close() {
+    closed = true;
     finished = nullptr;
     dropped = nullptr;
     disconnect(socket, nullptr, this, nullptr);

@@ -87,6 +87,7 @@ private:
     bool tooLarge = false;
     bool keepAlive = false;
     bool isConnected = false;
+    bool closed = false;
     bool writing = false;
     bool failedWhileWriting = false;
     QNetworkReply::NetworkError failedWith = QNetworkReply::NoError;
