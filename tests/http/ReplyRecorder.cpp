@@ -1,8 +1,8 @@
 #include "ReplyRecorder.h"
 
-#include <QDeadlineTimer>
 #include <QMetaEnum>
-#include <QMutexLocker>
+
+#include <chrono>
 
 ReplyRecorder::ReplyRecorder()
     : shared(std::make_shared<Shared>()) {}
@@ -10,27 +10,24 @@ ReplyRecorder::ReplyRecorder()
 HttpReplyCallback ReplyRecorder::callback(int id) const {
     return [shared = shared, id](QNetworkReply::NetworkError error, const QByteArray& headers,
                                  const QByteArray& body, bool reachedServer) {
-        QMutexLocker lock(&shared->mutex);
+        std::unique_lock<std::mutex> lock(shared->mutex);
         std::vector<Reply>& replies = shared->replies[id];
         if (replies.empty())
             shared->order.push_back(id);
         replies.push_back({error, headers, body, reachedServer, QThread::currentThread()});
-        shared->changed.wakeAll();
+        shared->changed.notify_all();
     };
 }
 
 bool ReplyRecorder::waitFor(int count, int timeoutMs) const {
-    const QDeadlineTimer deadline(timeoutMs);
-    QMutexLocker lock(&shared->mutex);
-    while (static_cast<int>(shared->replies.size()) < count) {
-        if (!shared->changed.wait(&shared->mutex, deadline))
-            return static_cast<int>(shared->replies.size()) >= count;
-    }
-    return true;
+    std::unique_lock<std::mutex> lock(shared->mutex);
+    return shared->changed.wait_for(lock, std::chrono::milliseconds(timeoutMs), [&] {
+        return static_cast<int>(shared->replies.size()) >= count;
+    });
 }
 
 std::map<int, std::string> ReplyRecorder::said(bool details) const {
-    QMutexLocker lock(&shared->mutex);
+    std::unique_lock<std::mutex> lock(shared->mutex);
     std::map<int, std::string> said;
     for (const auto& [id, replies] : shared->replies) {
         for (const Reply& reply : replies) {
@@ -50,12 +47,12 @@ std::map<int, std::string> ReplyRecorder::said(bool details) const {
 }
 
 ReplyRecorder::Reply ReplyRecorder::first(int id) const {
-    QMutexLocker lock(&shared->mutex);
+    std::unique_lock<std::mutex> lock(shared->mutex);
     const auto found = shared->replies.find(id);
     return found == shared->replies.end() ? Reply{} : found->second.front();
 }
 
 std::vector<int> ReplyRecorder::order() const {
-    QMutexLocker lock(&shared->mutex);
+    std::unique_lock<std::mutex> lock(shared->mutex);
     return shared->order;
 }

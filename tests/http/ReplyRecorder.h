@@ -2,12 +2,12 @@
 
 #include "ISimpleHTTPClient.h"
 
-#include <QMutex>
 #include <QThread>
-#include <QWaitCondition>
 
+#include <condition_variable>
 #include <map>
 #include <memory>
+#include <mutex>
 #include <string>
 #include <vector>
 
@@ -38,8 +38,9 @@ public:
 
 private:
     struct Shared {
-        QMutex mutex;
-        QWaitCondition changed;
+        // Standard primitives, which ThreadSanitizer sees, unlike Qt's.
+        std::mutex mutex;
+        std::condition_variable changed;
         std::map<int, std::vector<Reply>> replies;
         std::vector<int> order;
     };

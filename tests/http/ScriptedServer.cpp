@@ -28,7 +28,7 @@ void answerRequests(QTcpSocket* socket, QByteArray& buffer, int connection,
         buffer.remove(0, length);
         ScriptedServer::Reply reply{"", true};
         {
-            QMutexLocker lock(&state->mutex);
+            std::lock_guard<std::mutex> lock(state->mutex);
             const size_t index = state->requests.size();
             if (index < state->replies.size())
                 reply = state->replies[index];
@@ -54,7 +54,8 @@ ScriptedServer::ScriptedServer(std::vector<Reply> replies) {
         [this] {
             server = new QTcpServer;
             server->listen(QHostAddress::LocalHost, 0);
-            listeningPort = server->serverPort();
+            std::lock_guard<std::mutex> lock(state->mutex);
+            state->port = server->serverPort();
             QObject::connect(server, &QTcpServer::newConnection, server, [this] { accept(); });
         },
         Qt::BlockingQueuedConnection);
@@ -71,7 +72,7 @@ void ScriptedServer::accept() {
     while (QTcpSocket* socket = server->nextPendingConnection()) {
         int connection = 0;
         {
-            QMutexLocker lock(&state->mutex);
+            std::lock_guard<std::mutex> lock(state->mutex);
             connection = ++state->connections;
         }
         auto buffer = std::make_shared<QByteArray>();
@@ -84,12 +85,17 @@ void ScriptedServer::accept() {
     }
 }
 
+quint16 ScriptedServer::port() const {
+    std::lock_guard<std::mutex> lock(state->mutex);
+    return state->port;
+}
+
 int ScriptedServer::connections() const {
-    QMutexLocker lock(&state->mutex);
+    std::lock_guard<std::mutex> lock(state->mutex);
     return state->connections;
 }
 
 std::vector<std::string> ScriptedServer::requests() const {
-    QMutexLocker lock(&state->mutex);
+    std::lock_guard<std::mutex> lock(state->mutex);
     return state->requests;
 }

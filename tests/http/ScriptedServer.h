@@ -1,11 +1,11 @@
 #pragma once
 
 #include <QByteArray>
-#include <QMutex>
 #include <QObject>
 #include <QThread>
 
 #include <memory>
+#include <mutex>
 #include <string>
 #include <vector>
 
@@ -24,17 +24,18 @@ public:
     explicit ScriptedServer(std::vector<Reply> replies);
     ~ScriptedServer();
 
-    quint16 port() const { return listeningPort; }
+    quint16 port() const;
     int connections() const;
     // The request lines received, in order, each with the number of its connection (from 1).
     std::vector<std::string> requests() const;
 
     // Shared with the handlers on the server's thread.
     struct State {
-        QMutex mutex;
+        std::mutex mutex;
         std::vector<Reply> replies;
         std::vector<std::string> requests;
         int connections = 0;
+        quint16 port = 0;
     };
 
 private:
@@ -44,5 +45,4 @@ private:
     QThread thread;
     QObject context; // lives on thread, as do the server and its sockets
     QTcpServer* server = nullptr;
-    quint16 listeningPort = 0;
 };
