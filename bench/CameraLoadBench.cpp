@@ -1,7 +1,7 @@
 // CameraProxy::stopPTZMovement through the real Wendrel against cameras on loopback, with a fixed
 // number of operations in flight at all times. Prints one line of JSON: completed operations per
 // second, latency percentiles and failures. With --qt-only, the same GETs go straight through one
-// QNetworkAccessManager instead, to show what Qt Network itself manages.
+// QNetworkAccessManager instead, to show what Qt's own HTTP client manages.
 //
 //   quenvar-bench-camera --ports 8001[,8002...] [--in-flight 64] [--count 20000] [--warmup 2000]
 //                        [--qt-only]
