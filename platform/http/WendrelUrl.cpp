@@ -50,24 +50,26 @@ bool isPlainHost(const QString& host) {
 
 QUrl WendrelUrl::fromParts(const QString& host, quint16 port, bool useSSL,
                            const QString& pathWithQuery) {
-    QString origin;
+    const QString path = escapeStrays(pathWithQuery);
+    QString text;
+    text.reserve(host.size() + path.size() + 16);
     if (isPlainHost(host)) {
-        origin = (useSSL ? QLatin1String("https://") : QLatin1String("http://")) + host;
+        text.append(useSSL ? QLatin1String("https://") : QLatin1String("http://")).append(host);
         if (port != 0)
-            origin += QLatin1Char(':') + QString::number(port);
+            text.append(QLatin1Char(':')).append(QString::number(port));
     } else {
-        QUrl url;
-        url.setScheme(useSSL ? QStringLiteral("https") : QStringLiteral("http"));
-        url.setHost(host);
+        QUrl origin;
+        origin.setScheme(useSSL ? QStringLiteral("https") : QStringLiteral("http"));
+        origin.setHost(host);
         if (port != 0)
-            url.setPort(port);
-        origin = url.toString(QUrl::FullyEncoded);
+            origin.setPort(port);
+        text.append(origin.toString(QUrl::FullyEncoded));
     }
+    if (!path.startsWith(QLatin1Char('/')))
+        text.append(QLatin1Char('/'));
     // The setters for path and query would encode "%" a second time; parsing the whole URL
     // keeps valid escapes as they are.
-    const QString separator =
-        pathWithQuery.startsWith(QLatin1Char('/')) ? QString() : QStringLiteral("/");
-    return QUrl(origin + separator + escapeStrays(pathWithQuery), QUrl::TolerantMode);
+    return QUrl(text.append(path), QUrl::TolerantMode);
 }
 
 QUrl WendrelUrl::fromText(const QString& url) {

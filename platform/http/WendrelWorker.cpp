@@ -17,8 +17,13 @@ namespace {
 
 QString originOf(const QString& scheme, const QString& host, const QUrl& url) {
     const bool tls = scheme == QLatin1String("https");
-    return scheme + QLatin1Char(' ') + host + QLatin1Char(' ') +
-           QString::number(url.port(tls ? 443 : 80));
+    QString origin;
+    origin.reserve(scheme.size() + host.size() + 8);
+    return origin.append(scheme)
+        .append(QLatin1Char(' '))
+        .append(host)
+        .append(QLatin1Char(' '))
+        .append(QString::number(url.port(tls ? 443 : 80)));
 }
 
 QString originOf(const QUrl& url) {
