@@ -46,6 +46,10 @@ bool isPlainHost(const QString& host) {
     });
 }
 
+bool isHttps(const QUrl& url) {
+    return url.scheme() == QLatin1String("https");
+}
+
 } // namespace
 
 QUrl WendrelUrl::fromParts(const QString& host, quint16 port, bool useSSL,
@@ -79,4 +83,30 @@ QUrl WendrelUrl::fromText(const QString& url) {
 bool WendrelUrl::isHttp(const QUrl& url) {
     const QString scheme = url.scheme();
     return scheme == QLatin1String("http") || scheme == QLatin1String("https");
+}
+
+quint16 WendrelUrl::port(const QUrl& url) {
+    return quint16(url.port(isHttps(url) ? 443 : 80));
+}
+
+QString WendrelUrl::origin(const QUrl& url) {
+    const QString scheme = url.scheme();
+    const QString host = url.host();
+    QString origin;
+    origin.reserve(scheme.size() + host.size() + 8);
+    return origin.append(scheme)
+        .append(QLatin1Char(' '))
+        .append(host)
+        .append(QLatin1Char(' '))
+        .append(QString::number(port(url)));
+}
+
+QByteArray WendrelUrl::hostHeader(const QUrl& url) {
+    QByteArray host = url.host(QUrl::FullyEncoded).toLatin1();
+    if (host.contains(':'))
+        host = '[' + host + ']';
+    const quint16 portNumber = port(url);
+    if (portNumber != (isHttps(url) ? 443 : 80))
+        host += ':' + QByteArray::number(portNumber);
+    return host;
 }

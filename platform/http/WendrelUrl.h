@@ -1,5 +1,6 @@
 #pragma once
 
+#include <QByteArray>
 #include <QString>
 #include <QUrl>
 
@@ -12,4 +13,10 @@ public:
                           const QString& pathWithQuery);
     static QUrl fromText(const QString& url);
     static bool isHttp(const QUrl& url);
+    // The port, the scheme's default when the URL names none.
+    static quint16 port(const QUrl& url);
+    // Scheme, host and port: what one set of connections and remembered challenges serve.
+    static QString origin(const QUrl& url);
+    // The Host header's value: the port only when it is not the scheme's default.
+    static QByteArray hostHeader(const QUrl& url);
 };

@@ -15,21 +15,6 @@
 
 namespace {
 
-QString originOf(const QString& scheme, const QString& host, const QUrl& url) {
-    const bool tls = scheme == QLatin1String("https");
-    QString origin;
-    origin.reserve(scheme.size() + host.size() + 8);
-    return origin.append(scheme)
-        .append(QLatin1Char(' '))
-        .append(host)
-        .append(QLatin1Char(' '))
-        .append(QString::number(url.port(tls ? 443 : 80)));
-}
-
-QString originOf(const QUrl& url) {
-    return originOf(url.scheme(), url.host(), url);
-}
-
 // Headers the request line and body settle.
 bool framingHeader(const QByteArray& name) {
     for (const char* framing : {"Host", "Content-Length", "Transfer-Encoding", "Connection"}) {
@@ -37,17 +22,6 @@ bool framingHeader(const QByteArray& name) {
             return true;
     }
     return false;
-}
-
-QByteArray hostHeader(const QUrl& url) {
-    QByteArray host = url.host(QUrl::FullyEncoded).toLatin1();
-    if (host.contains(':'))
-        host = '[' + host + ']';
-    const int port = url.port();
-    const int defaultPort = url.scheme() == QLatin1String("https") ? 443 : 80;
-    if (port != -1 && port != defaultPort)
-        host += ':' + QByteArray::number(port);
-    return host;
 }
 
 // As Qt maps HTTP statuses of 400 and above.
@@ -112,13 +86,11 @@ void WendrelWorker::start(WendrelRequest request) {
         answer(request.callback, QNetworkReply::OperationCanceledError, {}, {}, false);
         return;
     }
-    const QString host = request.url.host();
-    const QString scheme = request.url.scheme();
-    if (host.isEmpty()) {
+    if (request.url.host().isEmpty()) {
         answer(request.callback, QNetworkReply::HostNotFoundError, {}, {}, false);
         return;
     }
-    if (scheme != QLatin1String("http") && scheme != QLatin1String("https")) {
+    if (!WendrelUrl::isHttp(request.url)) {
         answer(request.callback, QNetworkReply::ProtocolUnknownError, {}, {}, false);
         return;
     }
@@ -129,8 +101,7 @@ void WendrelWorker::start(WendrelRequest request) {
 
     const Id id = nextId++;
     Pending& entry = pending[id];
-    entry.origin = originOf(scheme, host, request.url);
-    entry.hostHeader = hostHeader(request.url);
+    entry.origin = WendrelUrl::origin(request.url);
     entry.slot = &origins[entry.origin];
     entry.deadline = request.deadline ? deadlines.emplace(*request.deadline, id) : deadlines.end();
     entry.request = std::move(request);
@@ -191,7 +162,7 @@ QByteArray WendrelWorker::message(const Pending& entry, const QByteArray& author
     QByteArray result;
     result.reserve(256 + request.body.size());
     result.append(request.method).append(' ').append(target).append(" HTTP/1.1\r\nHost: ");
-    result.append(entry.hostHeader).append("\r\n");
+    result.append(WendrelUrl::hostHeader(request.url)).append("\r\n");
     for (const QString& header : request.headers) {
         const qsizetype colon = header.indexOf(QLatin1Char(':'));
         const QByteArray name = header.left(colon).trimmed().toLatin1();
@@ -236,8 +207,8 @@ void WendrelWorker::launch(Id id, const QByteArray& authorization) {
         const QUrl& url = entry.request.url;
         const bool https = url.scheme() == QLatin1String("https");
         connection = new WendrelConnection(
-            url.host(), quint16(url.port(https ? 443 : 80)), https,
-            https ? tlsConfiguration() : std::nullopt, maxBodySize,
+            url.host(), WendrelUrl::port(url), https, https ? tlsConfiguration() : std::nullopt,
+            maxBodySize,
             [this, slot = entry.slot](WendrelConnection* gone) { dropped(*slot, gone); }, this);
         ++origin.open;
     }
@@ -338,7 +309,7 @@ bool WendrelWorker::followRedirect(Id id, const WendrelConnection::Answer& answe
     QNetworkReply::NetworkError refusal = QNetworkReply::NoError;
     if (!target.isValid() || !WendrelUrl::isHttp(target))
         refusal = QNetworkReply::ProtocolFailure;
-    else if (originOf(target) != entry.origin)
+    else if (WendrelUrl::origin(target) != entry.origin)
         refusal = QNetworkReply::InsecureRedirectError;
     else if (++entry.redirects > maxRedirects)
         refusal = QNetworkReply::TooManyRedirectsError;

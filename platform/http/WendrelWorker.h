@@ -47,7 +47,6 @@ private:
         WendrelRequest request; // kept for the answer to a challenge, a redirect or a resend
         QString origin;
         Origin* slot = nullptr;
-        QByteArray hostHeader;                   // a redirect keeps the origin, and so the host
         WendrelConnection* connection = nullptr; // none while waiting for its turn
         bool challengeAnswered = false;
         bool resent = false;
