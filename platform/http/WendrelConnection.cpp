@@ -159,34 +159,30 @@ void WendrelConnection::written(qint64 bytes) {
 
 void WendrelConnection::failed() {
     const QAbstractSocket::SocketError error = socket->error();
+    if (error == QAbstractSocket::RemoteHostClosedError)
+        endOfInput();
+    else if (!handledElsewhere(networkError(error)))
+        finish(networkError(error));
+}
+
+// A failure inside write() is answered by write(); one between exchanges drops the connection.
+bool WendrelConnection::handledElsewhere(QNetworkReply::NetworkError error) {
     if (writing) {
         failedWhileWriting = true;
-        failedWith = networkError(error);
-        return;
-    }
-    if (error == QAbstractSocket::RemoteHostClosedError) {
-        endOfInput();
-        return;
+        failedWith = error;
+        return true;
     }
     if (!finished) {
         if (dropped)
             dropped(this);
-        return;
+        return true;
     }
-    finish(networkError(error));
+    return false;
 }
 
 void WendrelConnection::endOfInput() {
-    if (writing) {
-        failedWhileWriting = true;
-        failedWith = QNetworkReply::RemoteHostClosedError;
+    if (handledElsewhere(QNetworkReply::RemoteHostClosedError))
         return;
-    }
-    if (!finished) {
-        if (dropped)
-            dropped(this);
-        return;
-    }
     const QByteArray rest = socket->readAll();
     if (!rest.isEmpty()) {
         feed(rest.constData(), rest.size());

@@ -62,6 +62,7 @@ private:
     void read();
     void written(qint64 bytes);
     void failed();
+    bool handledElsewhere(QNetworkReply::NetworkError error);
     void endOfInput();
     void feed(const char* data, qsizetype size);
     void endHeaderLine();
