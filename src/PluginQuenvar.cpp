@@ -1,5 +1,6 @@
 #include "PluginQuenvar.h"
 
+#include "DeliveryGate.h"
 #include "PluginQuenvarDefs.h"
 #include "QUILImplementation/VcaRuleRetriever.h"
 #include "ScopedTrace.h"
@@ -58,12 +59,12 @@ std::function<void(bool, QList<QString>)> presetListAdapter(const ResponseCallba
 }
 
 // The host may deliver a rule answer after the plugin is gone: it then reaches no one.
-ResponseCallback whilePluginLives(const std::weak_ptr<SubscriberList>& plugin,
+ResponseCallback whilePluginLives(const std::shared_ptr<DeliveryGate>& gate,
                                   ResponseCallback callback) {
-    return [plugin, callback = std::move(callback)](
-               bool handled, const QString& code, const QString& message, const QVariant& payload) {
-        if (const auto alive = plugin.lock(); alive && callback)
-            callback(handled, code, message, payload);
+    return [gate, callback = std::move(callback)](bool handled, const QString& code,
+                                                  const QString& message, const QVariant& payload) {
+        if (callback)
+            gate->pass([&] { callback(handled, code, message, payload); });
     };
 }
 
@@ -113,10 +114,12 @@ const CameraCommand CAMERA_COMMANDS[] = {
 } // namespace
 
 PluginQuenvar::PluginQuenvar()
-    : subscribers(std::make_shared<SubscriberList>()) {}
+    : subscribers(std::make_shared<SubscriberList>())
+    , gate(std::make_shared<DeliveryGate>()) {}
 
 PluginQuenvar::~PluginQuenvar() {
     ScopedTrace trace("PluginQuenvar::~PluginQuenvar", SOURCE_FILE, __LINE__);
+    gate->close();
 }
 
 bool PluginQuenvar::InitialPluginBase(IFrameworkTools* tools) {
@@ -143,7 +146,7 @@ void PluginQuenvar::Request(const QString& command, const QVariant& params,
         if (command == CMD_RETRIEVE_VCA_RAW_RULE_INFO) {
             if (const auto retriever = vcaRuleRetriever)
                 retriever->getLiveVcaRule(params.toString(),
-                                          whilePluginLives(subscribers, std::move(callback)));
+                                          whilePluginLives(gate, std::move(callback)));
             else
                 answer(callback, false, QVariant());
             return;
@@ -156,7 +159,7 @@ void PluginQuenvar::Request(const QString& command, const QVariant& params,
                     static_cast<quint64>(static_cast<qint64>(map.value(KEY_TIMESTAMP).toInt()));
                 retriever->getRecordingVcaRule(map.value(KEY_LOCATION_IDS).toStringList(),
                                                timestamp,
-                                               whilePluginLives(subscribers, std::move(callback)));
+                                               whilePluginLives(gate, std::move(callback)));
             } else {
                 answer(callback, false, QVariant());
             }
@@ -226,10 +229,9 @@ void PluginQuenvar::handleVCAMetadataChanged(const QString& cameraID) {
     const auto retriever = vcaRuleRetriever;
     if (!retriever)
         return;
-    std::weak_ptr<SubscriberList> target = subscribers;
-    retriever->getLiveVcaRule(
-        cameraID, [target](bool, const QString&, const QString&, const QVariant& payload) {
-            if (const auto list = target.lock())
-                list->emitToAll(payload, EVENT_LIVE_VCA_RULE_CHANGED, PLUGIN_ID);
-        });
+    retriever->getLiveVcaRule(cameraID, [gate = gate, list = subscribers](bool, const QString&,
+                                                                          const QString&,
+                                                                          const QVariant& payload) {
+        gate->pass([&] { list->emitToAll(payload, EVENT_LIVE_VCA_RULE_CHANGED, PLUGIN_ID); });
+    });
 }

@@ -7,6 +7,7 @@
 
 #include <memory>
 
+class DeliveryGate;
 class ICameraProxy;
 class SubscriberList;
 class VcaRuleRetriever;
@@ -48,8 +49,8 @@ public slots:
 private:
     std::shared_ptr<VcaRuleRetriever> vcaRuleRetriever;
     std::shared_ptr<ICameraProxy> cameraProxy;
-    // Shared with pending rule answers, events and client answers alike, which hold it weakly:
-    // once this object is gone they deliver nothing.
     std::shared_ptr<SubscriberList> subscribers;
+    // Shared with pending rule answers and events: once this object is gone they deliver nothing.
+    std::shared_ptr<DeliveryGate> gate;
     IPluginConnector* pluginConnector = nullptr;
 };

@@ -7,7 +7,11 @@
 
 #include <gtest/gtest.h>
 
+#include <atomic>
+#include <chrono>
 #include <climits>
+#include <future>
+#include <thread>
 
 namespace {
 
@@ -172,6 +176,41 @@ TEST(DispatchAfterDestructionTest, RuleAnswersDeliveredLaterReachNoOne) {
     rules->liveCalls.at(0).callback(true, "0", "", 1);
     rules->recordingCalls.at(0).callback(true, "0", "", 2);
     EXPECT_TRUE(answers.responses().isEmpty());
+}
+
+// An answer under way on another thread holds the destructor back until it returns; a callback
+// that destroys the plugin itself is not held back by its own answer.
+TEST(DispatchAfterDestructionTest, DestructionWaitsForAnswersUnderWayOnOtherThreads) {
+    FakeFrameworkTools tools;
+    auto rules = std::make_shared<FakeVcaRuleRetriever>();
+    auto* plugin = new PluginQuenvar;
+    ASSERT_TRUE(plugin->InitialPluginBase(&tools));
+    plugin->setVcaRuleRetriever(rules);
+
+    std::promise<void> entered;
+    std::promise<void> release;
+    std::atomic<bool> destroyed{false};
+    plugin->Request(RULE_COMMANDS[0], QVariant(), RequestSenderInfo{},
+                    [&entered, released = release.get_future().share()](auto&&...) {
+                        entered.set_value();
+                        released.wait();
+                    });
+    plugin->Request(RULE_COMMANDS[1], QVariant(), RequestSenderInfo{},
+                    [plugin, &destroyed](auto&&...) {
+                        delete plugin;
+                        destroyed = true;
+                    });
+
+    std::thread delivery(rules->liveCalls.at(0).callback, true, "0", "", QVariant());
+    entered.get_future().wait();
+    std::thread destruction(
+        [&] { rules->recordingCalls.at(0).callback(true, "0", "", QVariant()); });
+    std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    EXPECT_FALSE(destroyed);
+    release.set_value();
+    delivery.join();
+    destruction.join();
+    EXPECT_TRUE(destroyed);
 }
 
 } // namespace
