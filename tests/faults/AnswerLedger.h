@@ -1,10 +1,12 @@
 #pragma once
 
+#include "EventLoopWait.h"
 #include "PluginFramework.h"
 
 #include <QElapsedTimer>
 #include <QJsonObject>
 
+#include <algorithm>
 #include <map>
 #include <memory>
 #include <mutex>
@@ -19,14 +21,49 @@ public:
         QJsonObject first;     // handled, code, message and payload
     };
 
-    AnswerLedger();
+    AnswerLedger() { shared->clock.start(); }
+
     // The callback for request id; the request then counts as expected.
-    ResponseCallback callback(int id);
+    ResponseCallback callback(int id) {
+        std::lock_guard<std::mutex> lock(shared->mutex);
+        shared->entries[id];
+        return [shared = shared, id](bool handled, const QString& code, const QString& message,
+                                     const QVariant& payload) {
+            std::lock_guard<std::mutex> lock(shared->mutex);
+            ++shared->calls;
+            Entry& entry = shared->entries[id];
+            if (entry.calls++ == 0)
+                entry = Entry{1,
+                              shared->clock.elapsed(),
+                              {{"handled", handled},
+                               {"code", code},
+                               {"message", message},
+                               {"payload", QJsonValue::fromVariant(payload)}}};
+        };
+    }
+
     // Runs the Qt event loop until every expected request has an answer or timeoutMs passed.
-    bool waitForAll(int timeoutMs) const;
-    Entry entry(int id) const;
+    bool waitForAll(int timeoutMs) const {
+        return runEventLoopUntil(
+            [this] {
+                std::lock_guard<std::mutex> lock(shared->mutex);
+                return std::all_of(shared->entries.begin(), shared->entries.end(),
+                                   [](const auto& entry) { return entry.second.calls > 0; });
+            },
+            timeoutMs);
+    }
+
+    Entry entry(int id) const {
+        std::lock_guard<std::mutex> lock(shared->mutex);
+        const auto found = shared->entries.find(id);
+        return found == shared->entries.end() ? Entry() : found->second;
+    }
+
     // All answers so far, to any request.
-    int calls() const;
+    int calls() const {
+        std::lock_guard<std::mutex> lock(shared->mutex);
+        return shared->calls;
+    }
 
 private:
     struct Shared {

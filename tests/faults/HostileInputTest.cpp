@@ -35,20 +35,6 @@ QVariantMap hostile(const char* text) {
     return map;
 }
 
-// The texts of the elements called name in a command sent to the VCA plugin, one per line.
-std::string elementTexts(const QString& xml, const QString& name) {
-    QStringList texts;
-    QXmlStreamReader reader(xml);
-    while (!reader.atEnd()) {
-        reader.readNext();
-        if (reader.isStartElement() && reader.name() == name)
-            texts.append(reader.readElementText());
-    }
-    if (reader.hasError())
-        return "not XML: " + reader.errorString().toStdString() + " in " + xml.toStdString();
-    return texts.join('\n').toStdString();
-}
-
 class HostileInputTest : public ::testing::Test {
 protected:
     void SetUp() override {
@@ -85,16 +71,27 @@ protected:
         return value.toString().toStdString();
     }
 
-    QString sentToVca(const QString& command) const {
+    // The texts of the elements called name in the last command sent to the VCA plugin, one
+    // per line.
+    std::string sentToVca(const QString& command, const QString& name) const {
         QFile log(QDir(vca.path()).filePath("requests.log"));
-        QString last;
+        QString xml;
         if (log.open(QIODevice::ReadOnly)) {
             for (const QString& line : QString::fromUtf8(log.readAll()).split('\n')) {
                 if (line.startsWith(command + '\t'))
-                    last = line.mid(command.size() + 1);
+                    xml = line.mid(command.size() + 1);
             }
         }
-        return last;
+        QStringList texts;
+        QXmlStreamReader reader(xml);
+        while (!reader.atEnd()) {
+            reader.readNext();
+            if (reader.isStartElement() && reader.name() == name)
+                texts.append(reader.readElementText());
+        }
+        if (reader.hasError())
+            return "not XML: " + reader.errorString().toStdString() + " in " + xml.toStdString();
+        return texts.join('\n').toStdString();
     }
 
     CamsimProcess camsim;
@@ -136,8 +133,7 @@ TEST_F(HostileInputTest, CameraAndLocationIdentifiersReachTheVcaPluginEscaped) {
     ASSERT_EQ(
         send("getRecordingVCARule", QVariantMap{{"locationIDs", locations}, {"timestamp", 7}}),
         200);
-    EXPECT_EQ(elementTexts(sentToVca("GetVCARules"), "Cam"), camera.toStdString());
-    const QString sent = sentToVca("GetRecordingVCARules");
-    EXPECT_EQ(elementTexts(sent, "Loc"), locations.join('\n').toStdString());
-    EXPECT_EQ(elementTexts(sent, "QueryTime"), "7");
+    EXPECT_EQ(sentToVca("GetVCARules", "Cam"), camera.toStdString());
+    EXPECT_EQ(sentToVca("GetRecordingVCARules", "Loc"), locations.join('\n').toStdString());
+    EXPECT_EQ(sentToVca("GetRecordingVCARules", "QueryTime"), "7");
 }

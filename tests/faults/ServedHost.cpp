@@ -24,11 +24,8 @@ QJsonObject ServedHost::request(const QString& command, const QVariant& params) 
 }
 
 bool ServedHost::serve(const QStringList& arguments, const QProcessEnvironment& environment) {
-    return start(BuildPaths::bin(QStringLiteral("quenvar-host")),
-                 QStringList{QStringLiteral("serve"), QStringLiteral("--listen"),
-                             QStringLiteral("127.0.0.1:0")} +
-                     arguments,
-                 environment);
+    return start(BuildPaths::bin("quenvar-host"),
+                 QStringList{"serve", "--listen", "127.0.0.1:0"} + arguments, environment);
 }
 
 QList<ServedHost::Answer> ServedHost::post(const QList<QJsonObject>& requests) const {

@@ -1,13 +1,19 @@
-// Rule requests to a VCA plugin that never answers, answers garbage or answers twice, through
-// the host's request channel: each client is answered exactly once, with the failure result.
+// Rule requests from another thread to a VCA plugin that never answers (or only after the
+// deadline), answers garbage or answers twice, through the host's request channel: the plugin
+// is called in the host's main thread, and each client is answered exactly once, later, with the
+// failure result.
 #include "AnswerLedger.h"
 #include "PluginHost.h"
 #include "PluginQuenvar.h"
 
+#include <QCoreApplication>
 #include <QJsonArray>
 #include <QJsonDocument>
+#include <QThread>
 
 #include <gtest/gtest.h>
+
+#include <thread>
 
 namespace {
 
@@ -26,6 +32,7 @@ public:
     bool InitialPluginBase(IFrameworkTools*) override { return true; }
     void Request(const QString& command, const QVariant& params, const RequestSenderInfo&,
                  ResponseCallback callback) override {
+        EXPECT_EQ(QThread::currentThread(), QCoreApplication::instance()->thread());
         const QString content = params.toString();
         const QString reply =
             command == "GetVCARules"
@@ -51,11 +58,10 @@ public:
                              const RequestSenderInfo&, IResponser&) override {}
     void UnsubscribeEventBlock(const QString&, const QVariant&, IResponser&) override {}
 
+    QList<ResponseCallback> unanswered;
+
 signals:
     void vcaMetadataChanged(const QString& cameraID);
-
-private:
-    QList<ResponseCallback> unanswered;
 };
 
 QJsonObject metaData(const QString& id, const QStringList& commands = {}) {
@@ -114,10 +120,16 @@ TEST(VcaFaultTest, EveryRuleRequestIsAnsweredOnceWithTheFailureResult) {
         host.start();
 
         // All at once: the two that wait for the host's deadline wait together.
-        int id = 0;
-        for (const VcaCase& c : CASES)
-            plugin.Request(c.command, c.params, RequestSenderInfo(), ledger.callback(id++));
+        std::thread([&] {
+            int id = 0;
+            for (const VcaCase& c : CASES)
+                plugin.Request(c.command, c.params, RequestSenderInfo(), ledger.callback(id++));
+        }).join();
+        EXPECT_EQ(ledger.calls(), 0) << "answered within the request";
         ASSERT_TRUE(ledger.waitForAll(HOST_DEADLINE_MS + PROMPT_MS));
+        for (const ResponseCallback& late : vca.unanswered)
+            late(true, "0", QString(), "<GetVCARulesRes/>");
+        QCoreApplication::processEvents();
     }
 
     int id = 0;

@@ -1,34 +1,28 @@
 #include "ReplyRecorder.h"
 
+#include "EventLoopWait.h"
+
 #include <QMetaEnum>
-
-#include <chrono>
-
-ReplyRecorder::ReplyRecorder()
-    : shared(std::make_shared<Shared>()) {}
 
 HttpReplyCallback ReplyRecorder::callback(int id) const {
     return [shared = shared, id](QNetworkReply::NetworkError error, const QByteArray& headers,
                                  const QByteArray& body, bool reachedServer) {
-        std::unique_lock<std::mutex> lock(shared->mutex);
+        std::lock_guard<std::mutex> lock(shared->mutex);
         std::vector<Reply>& replies = shared->replies[id];
         if (replies.empty())
             shared->order.push_back(id);
         replies.push_back({error, headers, body, reachedServer, QThread::currentThread()});
-        shared->changed.notify_all();
     };
 }
 
 bool ReplyRecorder::waitFor(int count, int timeoutMs) const {
-    std::unique_lock<std::mutex> lock(shared->mutex);
-    return shared->changed.wait_for(lock, std::chrono::milliseconds(timeoutMs), [&] {
-        return static_cast<int>(shared->replies.size()) >= count;
-    });
+    return runEventLoopUntil([this, count] { return int(order().size()) >= count; }, timeoutMs);
 }
 
-std::map<int, std::string> ReplyRecorder::said(bool details) const {
-    std::unique_lock<std::mutex> lock(shared->mutex);
-    std::map<int, std::string> said;
+std::vector<std::string> ReplyRecorder::said(bool details) const {
+    std::lock_guard<std::mutex> lock(shared->mutex);
+    std::vector<std::string> said(shared->replies.empty() ? 0
+                                                          : shared->replies.rbegin()->first + 1);
     for (const auto& [id, replies] : shared->replies) {
         for (const Reply& reply : replies) {
             std::string& text = said[id];
@@ -47,12 +41,12 @@ std::map<int, std::string> ReplyRecorder::said(bool details) const {
 }
 
 ReplyRecorder::Reply ReplyRecorder::first(int id) const {
-    std::unique_lock<std::mutex> lock(shared->mutex);
+    std::lock_guard<std::mutex> lock(shared->mutex);
     const auto found = shared->replies.find(id);
     return found == shared->replies.end() ? Reply{} : found->second.front();
 }
 
 std::vector<int> ReplyRecorder::order() const {
-    std::unique_lock<std::mutex> lock(shared->mutex);
+    std::lock_guard<std::mutex> lock(shared->mutex);
     return shared->order;
 }

@@ -4,7 +4,6 @@
 
 #include <QThread>
 
-#include <condition_variable>
 #include <map>
 #include <memory>
 #include <mutex>
@@ -22,27 +21,24 @@ public:
         QThread* thread = nullptr;
     };
 
-    ReplyRecorder();
-
     // The callback holds the recorder's state, not the recorder, so it may outlive it.
     HttpReplyCallback callback(int id = 0) const;
-    // Waits until callbacks for count distinct ids arrived, or timeoutMs passed.
+    // Runs this thread's event loop until count distinct ids were answered, or timeoutMs passed.
     bool waitFor(int count, int timeoutMs = 5000) const;
-    // Per id, every callback as "Error reached: body" (the body's size when it is large), joined
-    // by " | ": exactly one is the contract. Without details, the errors' names alone, for where
-    // timing decides the rest.
-    std::map<int, std::string> said(bool details = true) const;
+    // By id, every callback as "Error reached: body" (the body's size when large), joined by
+    // " | ": exactly one is the contract; "" for an id not answered. Without details, the errors'
+    // names alone, for where timing decides the rest.
+    std::vector<std::string> said(bool details = true) const;
     Reply first(int id = 0) const;
     // Request ids in the order their first callback arrived.
     std::vector<int> order() const;
 
 private:
     struct Shared {
-        // Standard primitives, which ThreadSanitizer sees, unlike Qt's.
+        // A standard mutex, which ThreadSanitizer sees, unlike Qt's.
         std::mutex mutex;
-        std::condition_variable changed;
         std::map<int, std::vector<Reply>> replies;
         std::vector<int> order;
     };
-    std::shared_ptr<Shared> shared;
+    std::shared_ptr<Shared> shared = std::make_shared<Shared>();
 };

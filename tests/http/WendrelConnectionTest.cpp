@@ -1,19 +1,86 @@
 // How Wendrel's connections deal with what servers send, against a server that sends exactly what
 // a case scripts: kept-alive connections, a server that closes one, bodies in every framing,
-// interim answers, malformed answers and redirects.
+// interim answers, malformed answers and redirects; and what goes on the wire.
 #include "ReplyRecorder.h"
-#include "ScriptedServer.h"
 #include "Wendrel.h"
 
+#include <QHostAddress>
+#include <QRegularExpression>
+#include <QTcpServer>
+#include <QTcpSocket>
+
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
-#include <map>
 #include <string>
 #include <vector>
 
 namespace {
 
-using Reply = ScriptedServer::Reply;
+struct Reply {
+    Reply(const QByteArray& bytes, bool close = false)
+        : bytes(bytes)
+        , close(close) {}
+
+    QByteArray bytes; // written as they stand; may be empty
+    bool close;       // then the connection is closed
+};
+
+// The length of the first whole request in buffer, or 0 while it is incomplete.
+qsizetype requestLength(const QByteArray& buffer) {
+    static const QRegularExpression length(QStringLiteral("\r\ncontent-length: *(\\d+)"),
+                                           QRegularExpression::CaseInsensitiveOption);
+    const qsizetype head = buffer.indexOf("\r\n\r\n") + 4;
+    const qsizetype total =
+        head + length.match(QString::fromLatin1(buffer.left(head))).captured(1).toLongLong();
+    return head >= 4 && buffer.size() >= total ? total : 0;
+}
+
+// Answers the n-th whole request it reads with the n-th reply, for what a well-behaved server
+// would not do. Serves while the test's thread waits for the client in its event loop.
+class ScriptedServer : public QTcpServer {
+public:
+    explicit ScriptedServer(std::vector<Reply> script)
+        : replies(std::move(script)) {
+        listen(QHostAddress::LocalHost, 0);
+        connect(this, &QTcpServer::newConnection, this, [this] {
+            while (QTcpSocket* socket = nextPendingConnection()) {
+                const int connection = ++connections;
+                connect(socket, &QTcpSocket::readyRead, socket,
+                        [this, socket, connection] { answer(socket, connection); });
+            }
+        });
+    }
+
+    int connections = 0;
+    // The number of its connection (from 1), method and target of each request, joined by "; ".
+    std::string received;
+    std::vector<std::string> requests; // whole
+
+private:
+    void answer(QTcpSocket* socket, int connection) {
+        while (const qsizetype length = requestLength(socket->peek(socket->bytesAvailable()))) {
+            const QByteArray request = socket->read(length);
+            const Reply reply =
+                requests.size() < replies.size() ? replies[requests.size()] : Reply("", true);
+            requests.push_back(request.toStdString());
+            received += (received.empty() ? "" : "; ") + std::to_string(connection) + ' ' +
+                        request.left(request.indexOf(" HTTP/")).toStdString();
+            socket->write(reply.bytes);
+            if (reply.close) {
+                socket->disconnectFromHost();
+                return;
+            }
+        }
+    }
+
+    std::vector<Reply> replies;
+};
+
+template <typename... Replies>
+std::vector<Reply> script(const Replies&... replies) {
+    return {Reply(replies)...};
+}
 
 Reply ok(const QByteArray& body) {
     return {"HTTP/1.1 200 OK\r\nContent-Length: " + QByteArray::number(body.size()) + "\r\n\r\n" +
@@ -25,13 +92,21 @@ Reply redirect(const QByteArray& status, const QByteArray& location) {
             "\r\nContent-Length: 5\r\n\r\nmoved"};
 }
 
+Reply status(const QByteArray& status) {
+    return {"HTTP/1.1 " + status + "\r\nContent-Length: 4\r\n\r\nbusy"};
+}
+
+const QString HOST = QStringLiteral("127.0.0.1");
+const QString FORM = QStringLiteral("application/x-www-form-urlencoded");
+const qsizetype MAX_BODY = 8 << 20;
+
 struct Case {
     const char* name;
     std::vector<Reply> replies;
-    std::vector<QByteArray> methods; // one request each, to /0, /1, ...
-    std::map<int, std::string> said;
+    const char* methods; // one request each, to /0, /1, ...
+    const char* said;    // per request, joined by "; "
     int connections;
-    std::vector<std::string> received; // connection number and request line
+    const char* received; // connection number, method and target of each, joined by "; "
 };
 
 class WendrelConnectionTest : public ::testing::TestWithParam<Case> {};
@@ -42,113 +117,99 @@ TEST_P(WendrelConnectionTest, AnswersAsTheServerSaid) {
     ReplyRecorder recorder;
     {
         Wendrel client;
+        const QStringList methods = QString::fromLatin1(row.methods).split(' ');
         // One at a time, so that each may reuse the connection of the one before.
-        for (int id = 0; id < static_cast<int>(row.methods.size()); ++id) {
+        for (int id = 0; id < methods.size(); ++id) {
             const QString path = QStringLiteral("/%1").arg(id);
-            if (row.methods[id] == "GET")
-                client.Get(QStringLiteral("127.0.0.1"), path, server.port(), false, {}, {},
-                           recorder.callback(id), 5000, {});
+            if (methods[id] == "GET")
+                client.Get(HOST, path, server.serverPort(), false, {}, {}, recorder.callback(id),
+                           5000, {});
             else
-                client.Post(QStringLiteral("127.0.0.1"), "a=1", path, server.port(), false, {}, {},
-                            QStringLiteral("application/x-www-form-urlencoded"),
+                client.Post(HOST, "a=1", path, server.serverPort(), false, {}, {}, FORM,
                             recorder.callback(id), 5000);
             ASSERT_TRUE(recorder.waitFor(id + 1));
         }
     }
-    EXPECT_EQ(recorder.said(), row.said);
-    EXPECT_EQ(server.connections(), row.connections);
-    EXPECT_EQ(server.requests(), row.received);
+    std::string said;
+    for (const std::string& text : recorder.said())
+        said += (said.empty() ? "" : "; ") + text;
+    EXPECT_EQ(said, row.said);
+    EXPECT_EQ(server.connections, row.connections);
+    EXPECT_EQ(server.received, row.received);
 }
-
-const QByteArray GET = "GET";
 
 INSTANTIATE_TEST_SUITE_P(
     Cases, WendrelConnectionTest,
     ::testing::Values(
-        Case{"KeptAlive",
-             {ok("a"), ok("b"), ok("c")},
-             {GET, "POST", GET},
-             {{0, "NoError reached: a"}, {1, "NoError reached: b"}, {2, "NoError reached: c"}},
-             1,
-             {"1 GET /0 HTTP/1.1", "1 POST /1 HTTP/1.1", "1 GET /2 HTTP/1.1"}},
+        Case{"KeptAlive", script(ok("a"), ok("b"), ok("c")), "GET POST GET",
+             "NoError reached: a; NoError reached: b; NoError reached: c", 1,
+             "1 GET /0; 1 POST /1; 1 GET /2"},
         // A server may close a kept-alive connection just as the next request goes out: that
         // request goes again on a new connection, once.
-        Case{"ClosedBeforeAnswering",
-             {ok("a"), {"", true}, ok("b")},
-             {GET, GET},
-             {{0, "NoError reached: a"}, {1, "NoError reached: b"}},
-             2,
-             {"1 GET /0 HTTP/1.1", "1 GET /1 HTTP/1.1", "2 GET /1 HTTP/1.1"}},
-        Case{"ClosedAfterAnswering",
-             {{ok("a").bytes, true}, ok("b")},
-             {GET, GET},
-             {{0, "NoError reached: a"}, {1, "NoError reached: b"}},
-             2,
-             {"1 GET /0 HTTP/1.1", "2 GET /1 HTTP/1.1"}},
-        Case{"ClosedMidAnswer",
-             {ok("a"), {"HTTP/1.1 200 OK\r\nContent-Length: 10\r\n\r\npart", true}},
-             {GET, GET},
-             {{0, "NoError reached: a"}, {1, "RemoteHostClosedError reached: part"}},
-             1,
-             {"1 GET /0 HTTP/1.1", "1 GET /1 HTTP/1.1"}},
-        Case{
-            "ConnectionClose",
-            {{"HTTP/1.1 200 OK\r\nConnection: close\r\nContent-Length: 1\r\n\r\na", true}, ok("b")},
-            {GET, GET},
-            {{0, "NoError reached: a"}, {1, "NoError reached: b"}},
-            2,
-            {"1 GET /0 HTTP/1.1", "2 GET /1 HTTP/1.1"}},
-        Case{"BodyUntilClose",
-             {{"HTTP/1.1 200 OK\r\n\r\nall of it", true}},
-             {GET},
-             {{0, "NoError reached: all of it"}},
-             1,
-             {"1 GET /0 HTTP/1.1"}},
-        Case{"Chunked",
-             {{"HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n3\r\nabc\r\n2\r\nde\r\n"
-               "0\r\n\r\n"},
-              ok("f")},
-             {GET, GET},
-             {{0, "NoError reached: abcde"}, {1, "NoError reached: f"}},
-             1,
-             {"1 GET /0 HTTP/1.1", "1 GET /1 HTTP/1.1"}},
-        Case{"Interim",
-             {{"HTTP/1.1 100 Continue\r\n\r\nHTTP/1.1 200 OK\r\nContent-Length: 1\r\n\r\nz"}},
-             {"POST"},
-             {{0, "NoError reached: z"}},
-             1,
-             {"1 POST /0 HTTP/1.1"}},
-        Case{"Malformed",
-             {{"HTTP/9 banana\r\n\r\n", true}},
-             {GET},
-             {{0, "ProtocolFailure reached"}},
-             1,
-             {"1 GET /0 HTTP/1.1"}},
+        Case{"ClosedBeforeAnswering", script(ok("a"), Reply("", true), ok("b")), "GET GET",
+             "NoError reached: a; NoError reached: b", 2, "1 GET /0; 1 GET /1; 2 GET /1"},
+        // Closed by the server, or to be closed by it: never used again.
+        Case{"NotReusedOnceClosed",
+             script(Reply(ok("a").bytes, true),
+                    "HTTP/1.1 200 OK\r\nConnection: close\r\nContent-Length: 1\r\n\r\nb", ok("c")),
+             "GET GET GET", "NoError reached: a; NoError reached: b; NoError reached: c", 3,
+             "1 GET /0; 2 GET /1; 3 GET /2"},
+        Case{"Framings",
+             script("HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n3\r\nabc\r\n2\r\nde\r\n"
+                    "0\r\n\r\n",
+                    ok("f"), Reply("HTTP/1.1 200 OK\r\n\r\nall of it", true)),
+             "GET GET GET",
+             "NoError reached: abcde; NoError reached: f; NoError reached: all of it", 1,
+             "1 GET /0; 1 GET /1; 1 GET /2"},
+        // The limit holds for a declared length and for a body that runs until the close.
+        Case{"BodyUpToTheLimit",
+             script(ok(QByteArray(MAX_BODY, 'x')),
+                    Reply("HTTP/1.1 200 OK\r\n\r\n" + QByteArray(MAX_BODY + 1, 'x'), true)),
+             "GET GET", "NoError reached: 8388608 bytes; UnknownContentError reached", 1,
+             "1 GET /0; 1 GET /1"},
+        // An interim answer before the final one; a status line that is none.
+        Case{"StatusLines",
+             script("HTTP/1.1 100 Continue\r\n\r\nHTTP/1.1 200 OK\r\nContent-Length: 1\r\n\r\nz",
+                    Reply("HTTP/9 banana\r\n\r\n", true)),
+             "POST GET", "NoError reached: z; ProtocolFailure reached", 1, "1 POST /0; 1 GET /1"},
         Case{"ErrorStatus",
-             {{"HTTP/1.1 503 Busy\r\nContent-Length: 4\r\n\r\nbusy"}, ok("b")},
-             {GET, GET},
-             {{0, "ServiceUnavailableError reached: busy"}, {1, "NoError reached: b"}},
-             1,
-             {"1 GET /0 HTTP/1.1", "1 GET /1 HTTP/1.1"}},
-        Case{"RedirectSameOrigin",
-             {redirect("302 Found", "/next?x=1"), ok("there")},
-             {GET},
-             {{0, "NoError reached: there"}},
-             1,
-             {"1 GET /0 HTTP/1.1", "1 GET /next?x=1 HTTP/1.1"}},
-        Case{"RedirectAfterPost",
-             {redirect("303 See Other", "/done"), ok("done")},
-             {"POST"},
-             {{0, "NoError reached: done"}},
-             1,
-             {"1 POST /0 HTTP/1.1", "1 GET /done HTTP/1.1"}},
-        // Credentials go to the server they were meant for only.
-        Case{"RedirectElsewhere",
-             {redirect("307 Temporary Redirect", "http://localhost:1/x")},
-             {GET},
-             {{0, "InsecureRedirectError reached: moved"}},
-             1,
-             {"1 GET /0 HTTP/1.1"}}),
+             script(status("404 Not Found"), status("500 Oops"), status("503 Busy"), ok("b")),
+             "GET GET GET GET",
+             "ContentNotFoundError reached: busy; InternalServerError reached: busy; "
+             "ServiceUnavailableError reached: busy; NoError reached: b",
+             1, "1 GET /0; 1 GET /1; 1 GET /2; 1 GET /3"},
+        // Followed within the origin only, where the credentials were meant to go.
+        Case{"Redirects",
+             script(redirect("302 Found", "/next?x=1"), ok("there"),
+                    redirect("303 See Other", "/done"), ok("done"),
+                    redirect("307 Temporary Redirect", "http://localhost:1/x")),
+             "GET POST GET",
+             "NoError reached: there; NoError reached: done; InsecureRedirectError reached: moved",
+             1, "1 GET /0; 1 GET /next?x=1; 1 POST /1; 1 GET /done; 1 GET /2"}),
     [](const ::testing::TestParamInfo<Case>& info) { return std::string(info.param.name); });
+
+// The headers asked for go out, and no credentials until a server challenges them.
+TEST(WendrelRequestTest, SendsTheHeadersAskedForAndNoCredentialsUnasked) {
+    using namespace ::testing;
+    ScriptedServer server(script(ok("a"), ok("b")));
+    ReplyRecorder recorder;
+    Wendrel client;
+    client.Get(HOST, "/a.cgi?b=%26", server.serverPort(), false, "operator", "s3cret",
+               recorder.callback(0), 5000, {"X-Probe: one"});
+    client.PostWithOAuth(HOST, "a=1", "/token", server.serverPort(), false, "operator", "t0ken",
+                         FORM, recorder.callback(1), 5000);
+    ASSERT_TRUE(recorder.waitFor(2));
+
+    EXPECT_THAT(
+        server.requests,
+        UnorderedElementsAre(
+            AllOf(StartsWith("GET /a.cgi?b=%26 HTTP/1.1\r\n"), HasSubstr("\r\nX-Probe: one\r\n")),
+            AllOf(StartsWith("POST /token HTTP/1.1\r\n"),
+                  HasSubstr("\r\nAuthorization: Bearer t0ken\r\n"),
+                  HasSubstr("\r\nContent-Type: " + FORM.toStdString() + "\r\n"),
+                  EndsWith("\r\n\r\na=1"))));
+    for (const char* credentials : {"operator", "s3cret", "Basic", "Digest"})
+        EXPECT_THAT(server.requests, Each(Not(HasSubstr(credentials))));
+}
 
 } // namespace

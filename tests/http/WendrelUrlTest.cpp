@@ -2,15 +2,11 @@
 
 #include <gtest/gtest.h>
 
+#include <tuple>
+
 TEST(WendrelUrlTest, FormsTheUrlFromItsParts) {
-    struct Row {
-        const char* host;
-        quint16 port;
-        bool useSSL;
-        const char* pathWithQuery;
-        const char* url;
-    };
-    const Row rows[] = {
+    // Host, port, TLS, path with query, and the URL they make.
+    const std::tuple<const char*, quint16, bool, const char*, const char*> rows[] = {
         // Port 0 is the scheme's default.
         {"cam", 0, false, "/a", "http://cam/a"},
         {"cam", 0, true, "/a", "https://cam/a"},
@@ -27,11 +23,8 @@ TEST(WendrelUrlTest, FormsTheUrlFromItsParts) {
         {"cam", 0, false, "/c.cgi?name=#1", "http://cam/c.cgi?name=%231"},
         {"cam", 0, false, "c.cgi", "http://cam/c.cgi"},
     };
-    for (const Row& row : rows) {
-        EXPECT_EQ(WendrelUrl::fromParts(QString::fromUtf8(row.host), row.port, row.useSSL,
-                                        QString::fromUtf8(row.pathWithQuery))
-                      .toEncoded()
-                      .toStdString(),
-                  row.url);
-    }
+    for (const auto& [host, port, useSSL, pathWithQuery, url] : rows)
+        EXPECT_EQ(
+            WendrelUrl::fromParts(host, port, useSSL, pathWithQuery).toEncoded().toStdString(),
+            url);
 }

@@ -6,7 +6,7 @@
 class BuildPaths {
 public:
     static QString root();
-    static QString bin(const QString& name);
-    static QString plugins();
-    static QString lib();
+    static QString bin(const QString& name) { return root() + QStringLiteral("/bin/") + name; }
+    static QString plugins() { return root() + QStringLiteral("/plugins"); }
+    static QString lib() { return root() + QStringLiteral("/lib"); }
 };

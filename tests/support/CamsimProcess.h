@@ -1,9 +1,10 @@
 #pragma once
 
+#include "ListeningProcess.h"
+
 #include <QByteArray>
 #include <QList>
 #include <QPair>
-#include <QProcess>
 #include <QString>
 #include <QStringList>
 #include <QTemporaryDir>
@@ -12,7 +13,7 @@
 #include <vector>
 
 // quenvar-camsim as a child process on an ephemeral loopback port, logging to a temporary file;
-// killed when this object goes.
+// ended when this object goes.
 class CamsimProcess {
 public:
     using Headers = QList<QPair<QByteArray, QByteArray>>;
@@ -24,11 +25,12 @@ public:
     };
 
     explicit CamsimProcess(const QStringList& arguments = {});
-    ~CamsimProcess();
 
     // 0 when the simulator did not come up; error() then says why.
-    quint16 port() const { return listeningPort; }
-    QString error() const { return failure; }
+    quint16 port() const { return process.port(); }
+    QString error() const {
+        return port() ? QString() : "quenvar-camsim did not start: " + process.errorOutput();
+    }
     static QString host() { return QStringLiteral("127.0.0.1"); }
 
     // The camera requests received so far, one "method TAB target TAB body" line each. The
@@ -44,7 +46,5 @@ public:
 
 private:
     QTemporaryDir folder;
-    QProcess process;
-    quint16 listeningPort = 0;
-    QString failure;
+    ListeningProcess process;
 };

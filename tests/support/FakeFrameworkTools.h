@@ -21,22 +21,22 @@ public:
         bool connected = false;
     };
 
-    FakeFrameworkTools();
-
-    QString GetFrameworkVersion() const override;
-    IPluginConnector* GetPluginConnector() override;
-    QVariantMap GetPluginMetaData(const QString& pluginId) const override;
-    IPluginRequestChannel* GetRequestChannel() override;
-    EventEmitter& GetEventEmitter() override;
+    QString GetFrameworkVersion() const override { return QStringLiteral("test"); }
+    IPluginConnector* GetPluginConnector() override { return this; }
+    QVariantMap GetPluginMetaData(const QString&) const override { return {}; }
+    IPluginRequestChannel* GetRequestChannel() override { return &channel; }
+    EventEmitter& GetEventEmitter() override { return emitter; }
 
     bool ConnectPluginSignal(const QString& pluginId, const char* signal, const QObject* receiver,
                              const char* method, int connectionType) override;
 
     // The object that plays the plugin pluginId for ConnectPluginSignal.
-    void registerPlugin(const QString& pluginId, QObject* plugin);
+    void registerPlugin(const QString& pluginId, QObject* plugin) {
+        plugins.insert(pluginId, plugin);
+    }
 
     FakeRequestChannel channel;
-    EventEmitter emitter;
+    EventEmitter emitter = [](PluginObjBase_EventInfoBase*) {};
     QList<Connection> connections;
 
 private:

@@ -1,17 +1,5 @@
 #include "FakeRequestChannel.h"
 
-namespace {
-int contextTag;
-}
-
-IPluginRequestChannel::Context FakeRequestChannel::contextValue() {
-    return &contextTag;
-}
-
-IPluginRequestChannel::Context FakeRequestChannel::GetRequestContext() {
-    return contextValue();
-}
-
 bool FakeRequestChannel::SendRequest(const QString& pluginID, Context context, int kind,
                                      const QString& command, PluginRequestInfo& info) {
     std::lock_guard<std::mutex> lock(mutex);
@@ -24,18 +12,8 @@ QList<FakeRequestChannel::Sent> FakeRequestChannel::sent() const {
     return requests;
 }
 
-int FakeRequestChannel::count() const {
-    std::lock_guard<std::mutex> lock(mutex);
-    return requests.size();
-}
-
 void FakeRequestChannel::reply(int index, bool success, const QString& message,
                                const QString& relayPath, const QString& statusCode,
                                const QString& replyText, bool flag) const {
-    PluginReplyCallback callback;
-    {
-        std::lock_guard<std::mutex> lock(mutex);
-        callback = requests.at(index).info.callback;
-    }
-    callback(success, message, relayPath, statusCode, replyText, flag);
+    sent().at(index).info.callback(success, message, relayPath, statusCode, replyText, flag);
 }

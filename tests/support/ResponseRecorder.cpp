@@ -14,10 +14,6 @@ ResponseCallback ResponseRecorder::callback() const {
     };
 }
 
-QList<ResponseRecorder::Response> ResponseRecorder::responses() const {
-    return *recorded;
-}
-
 void PrintTo(const ResponseRecorder::Response& response, std::ostream* out) {
     QString text;
     QDebug(&text) << response.handled << response.code << response.message << response.payload;

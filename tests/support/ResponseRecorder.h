@@ -22,7 +22,7 @@ public:
     };
 
     ResponseCallback callback() const;
-    QList<Response> responses() const;
+    QList<Response> responses() const { return *recorded; }
 
 private:
     std::shared_ptr<QList<Response>> recorded = std::make_shared<QList<Response>>();

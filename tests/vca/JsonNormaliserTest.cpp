@@ -8,28 +8,31 @@
 
 #include <gtest/gtest.h>
 
+#include <string_view>
+
 namespace {
 
+using namespace std::string_view_literals;
+
 // What Qt's own round trip makes of {"v":TEXT}: the reference the normaliser must match.
-std::optional<QByteArray> byQt(const QByteArray& text) {
+std::string byQt(const QByteArray& text) {
     const QJsonValue value =
         QJsonDocument::fromJson("{\"v\":" + text + "}").object().value(QLatin1String("v"));
     if (value.isUndefined())
-        return std::nullopt;
+        return "(invalid)";
     const QByteArray array = QJsonDocument(QJsonArray{value}).toJson(QJsonDocument::Compact);
-    return array.mid(1, array.size() - 2);
+    return array.mid(1, array.size() - 2).toStdString();
+}
+
+std::string normalised(const QByteArray& text) {
+    const std::optional<QByteArray> value = JsonNormaliser::wrappedValue(text);
+    return value ? value->toStdString() : "(invalid)";
 }
 
 class JsonNormaliserTest : public testing::TestWithParam<const char*> {};
 
 TEST_P(JsonNormaliserTest, WritesWhatQtsRoundTripWrites) {
-    const QByteArray text(GetParam());
-    const std::optional<QByteArray> expected = byQt(text);
-    const std::optional<QByteArray> actual = JsonNormaliser::wrappedValue(text);
-    ASSERT_EQ(actual.has_value(), expected.has_value());
-    if (expected) {
-        EXPECT_EQ(actual->toStdString(), expected->toStdString());
-    }
+    EXPECT_EQ(normalised(GetParam()), byQt(GetParam()));
 }
 
 INSTANTIATE_TEST_SUITE_P(
@@ -59,50 +62,26 @@ INSTANTIATE_TEST_SUITE_P(
         // Keys beyond the BMP, whose order in Qt depends on how the key was stored.
         "{\"\xef\xbf\xbf\":1,\"\xf0\x90\x80\x80\":2}", R"({"\uffff":1,"\ud800\udc00":2})",
         "{\"\xf0\x90\x80\x80\":1,\"\\uffff\":2}",
-        // Invalid literals and an embedded NUL.
+        // Invalid literals.
         "[truth]", "[nulll]", "[False]"));
 
-TEST(JsonNormaliserDepthTest, DeepTextsAgreeWithQtOnBothSidesOfItsLimit) {
-    for (const int depth : {500, 1022, 1023, 1024, 5000}) {
-        const QByteArray text = QByteArray(depth, '[') + QByteArray(depth, ']');
-        const std::optional<QByteArray> expected = byQt(text);
-        const std::optional<QByteArray> actual = JsonNormaliser::wrappedValue(text);
-        ASSERT_EQ(actual.has_value(), expected.has_value()) << depth;
-        if (expected) {
-            EXPECT_EQ(*actual, *expected) << depth;
-        }
-    }
+TEST(JsonNormaliserTest, DeepTextsAndAnEmbeddedNulAreReadAsQtReadsThem) {
+    std::vector<QByteArray> texts{QByteArray("1}\0{\"a\":2", 9)};
+    // Both sides of Qt's limit.
+    for (const int depth : {500, 1022, 1023, 1024, 5000})
+        texts.push_back(QByteArray(depth, '[') + QByteArray(depth, ']'));
+    for (const QByteArray& text : texts)
+        EXPECT_EQ(normalised(text), byQt(text)) << text.size();
 }
 
-TEST(JsonNormaliserTest, EmbeddedNulIsReadAsQtReadsIt) {
-    const QByteArray text("1}\0{\"a\":2", 9);
-    EXPECT_EQ(JsonNormaliser::wrappedValue(text), byQt(text));
-}
-
-TEST(JsonNormaliserStringTest, EscapesAsQtsWriter) {
-    const QString texts[] = {
-        QStringLiteral("plain"),
-        QString::fromUtf8("\"\\/\b\f\n\r\t\x01\x1f\x7f"),
-        QString(QChar(0)),
-        QString::fromUtf8("\xc3\xa9\xe2\x82\xac\xef\xbf\xbf\xf0\x9f\x98\x80"),
-        QString(QChar(0xd800)) + QLatin1Char('x'),
-        QString(QChar(0xdc00)),
-        QString(QChar(0xd83d)),
-        QString(QChar(0xd83d)) + QChar(0xd83d) + QChar(0xde00),
-    };
-    for (const QString& text : texts) {
-        QByteArray actual;
-        JsonNormaliser::appendString(actual, text);
-        const QByteArray array = QJsonDocument(QJsonArray{text}).toJson(QJsonDocument::Compact);
-        EXPECT_EQ(actual, array.mid(1, array.size() - 2)) << text.toStdString();
-    }
-}
-
-// Types and names in the order and escaping of a QJsonObject, also beyond the BMP.
-TEST(JsonNormaliserStringTest, RulesTextIsWhatQtWritesForTheSameMap) {
-    const QString names[] = {QStringLiteral("b"), QString(QChar(0xffff)),
-                             QString::fromUtf8("\xf0\x90\x80\x80"), QStringLiteral("a\"q\\\n"),
-                             QString()};
+// Types and names in the order and escaping of a QJsonObject: blanks, controls, NUL, beyond the
+// BMP, lone surrogates; separated by "|".
+TEST(JsonNormaliserTest, RulesTextIsWhatQtWritesForTheSameMap) {
+    const QStringList names =
+        QStringView(u"b|\xffff|\U00010000|a\"q\\\n||\"\\/\b\f\n\r\t\x01\x1f\x7f|\0|"
+                    u"\u00e9\u20ac\U0001F600|\xd800x|\xdc00|\xd83d|\xd83d\xd83d\xde00"sv)
+            .toString()
+            .split(u'|');
     VcaRuleRetriever::VcaRuleRetrieverPrivate::RulesByType rules;
     QJsonObject expected;
     for (const QString& type : names) {
