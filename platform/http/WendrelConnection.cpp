@@ -227,16 +227,19 @@ void WendrelConnection::finish(QNetworkReply::NetworkError error) {
     done(this, std::move(answer));
 }
 
+void WendrelConnection::beginValue() {
+    fieldEnd = answer.headers.size();
+    answer.headers.append(": ");
+    valueStart = answer.headers.size();
+}
+
 // Header lines go straight into the answer's text; only the two values used are copied.
 void WendrelConnection::endHeaderLine() {
     if (!readingField && !readingValue)
         return;
+    if (!readingValue)
+        beginValue();
     QByteArray& text = answer.headers;
-    if (!readingValue) {
-        fieldEnd = text.size();
-        text.append(": ");
-        valueStart = text.size();
-    }
     const QByteArrayView field(text.constData() + fieldStart, fieldEnd - fieldStart);
     const QByteArrayView value(text.constData() + valueStart, text.size() - valueStart);
     const auto named = [&field](QByteArrayView name) {
@@ -280,9 +283,7 @@ int WendrelConnection::onHeaderValue(http_parser* parser, const char* at, size_t
     WendrelConnection* self = ownerOf(parser);
     if (!self->readingValue) {
         self->readingValue = true;
-        self->fieldEnd = self->answer.headers.size();
-        self->answer.headers.append(": ");
-        self->valueStart = self->answer.headers.size();
+        self->beginValue();
     }
     self->answer.headers.append(at, qsizetype(length));
     return 0;

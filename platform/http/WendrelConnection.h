@@ -65,6 +65,7 @@ private:
     bool handledElsewhere(QNetworkReply::NetworkError error);
     void endOfInput();
     void feed(const char* data, qsizetype size);
+    void beginValue();
     void endHeaderLine();
     void finish(QNetworkReply::NetworkError error);
 

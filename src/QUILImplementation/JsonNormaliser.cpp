@@ -347,40 +347,29 @@ std::optional<QByteArray> JsonNormaliser::wrappedValue(const QByteArray& text) {
 }
 
 void JsonNormaliser::appendString(QByteArray& out, QStringView text) {
-    std::string quoted;
-    quoted.reserve(std::size_t(text.size()) + 2);
-    quoted += '"';
-    const qsizetype length = text.size();
-    for (qsizetype i = 0; i < length; ++i) {
+    out += '"';
+    qsizetype runStart = 0;
+    for (qsizetype i = 0; i < text.size(); ++i) {
         const char16_t u = text[i].unicode();
-        char32_t code = u;
-        if (u < 0x80) {
-            if (!appendEscapedAscii(quoted, static_cast<unsigned char>(u)))
-                quoted += char(u);
+        if (QChar::isHighSurrogate(u) && i + 1 < text.size() && text[i + 1].isLowSurrogate()) {
+            ++i;
             continue;
         }
-        if (QChar::isSurrogate(u)) {
-            if (!QChar::isHighSurrogate(u) || i + 1 == length || !text[i + 1].isLowSurrogate()) {
-                // Qt's writer escapes a lone surrogate, which has no UTF-8 form.
-                quoted += "\\u";
-                for (int shift = 12; shift >= 0; shift -= 4)
-                    quoted += hexDigit((u >> shift) & 0xf);
-                continue;
-            }
-            code = QChar::surrogateToUcs4(u, text[++i].unicode());
-        }
-        if (code < 0x800) {
-            quoted += char(0xc0 | (code >> 6));
-        } else if (code < 0x10000) {
-            quoted += char(0xe0 | (code >> 12));
-            quoted += char(0x80 | ((code >> 6) & 0x3f));
+        if (u >= 0x20 && u != '"' && u != '\\' && !QChar::isSurrogate(u))
+            continue;
+        out += text.mid(runStart, i - runStart).toUtf8();
+        std::string escaped;
+        if (u < 0x80) {
+            appendEscapedAscii(escaped, static_cast<unsigned char>(u));
         } else {
-            quoted += char(0xf0 | (code >> 18));
-            quoted += char(0x80 | ((code >> 12) & 0x3f));
-            quoted += char(0x80 | ((code >> 6) & 0x3f));
+            // Qt's writer escapes a lone surrogate, which has no UTF-8 form.
+            escaped = "\\u";
+            for (int shift = 12; shift >= 0; shift -= 4)
+                escaped += hexDigit((u >> shift) & 0xf);
         }
-        quoted += char(0x80 | (code & 0x3f));
+        out.append(escaped.data(), qsizetype(escaped.size()));
+        runStart = i + 1;
     }
-    quoted += '"';
-    out.append(quoted.data(), qsizetype(quoted.size()));
+    out += text.mid(runStart).toUtf8();
+    out += '"';
 }
