@@ -46,10 +46,6 @@ bool isPlainHost(const QString& host) {
     });
 }
 
-bool isHttps(const QUrl& url) {
-    return url.scheme() == QLatin1String("https");
-}
-
 } // namespace
 
 QUrl WendrelUrl::fromParts(const QString& host, quint16 port, bool useSSL,
@@ -83,6 +79,10 @@ QUrl WendrelUrl::fromText(const QString& url) {
 bool WendrelUrl::isHttp(const QUrl& url) {
     const QString scheme = url.scheme();
     return scheme == QLatin1String("http") || scheme == QLatin1String("https");
+}
+
+bool WendrelUrl::isHttps(const QUrl& url) {
+    return url.scheme() == QLatin1String("https");
 }
 
 quint16 WendrelUrl::port(const QUrl& url) {

@@ -12,7 +12,9 @@ public:
     static QUrl fromParts(const QString& host, quint16 port, bool useSSL,
                           const QString& pathWithQuery);
     static QUrl fromText(const QString& url);
+    // Whether the scheme is http or https.
     static bool isHttp(const QUrl& url);
+    static bool isHttps(const QUrl& url);
     // The port, the scheme's default when the URL names none.
     static quint16 port(const QUrl& url);
     // Scheme, host and port: what one set of connections and remembered challenges serve.

@@ -205,7 +205,7 @@ void WendrelWorker::launch(Id id, const QByteArray& authorization) {
         origin.idle.pop_back();
     } else {
         const QUrl& url = entry.request.url;
-        const bool https = url.scheme() == QLatin1String("https");
+        const bool https = WendrelUrl::isHttps(url);
         connection = new WendrelConnection(
             url.host(), WendrelUrl::port(url), https, https ? tlsConfiguration() : std::nullopt,
             maxBodySize,
