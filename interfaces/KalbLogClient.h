@@ -2,6 +2,7 @@
 // trace object. A missing library, entry or trace-object word silences output; nothing else
 // changes. The library is looked up beside the module first, then on the system's search path,
 // never in the working directory, so a file planted there cannot be loaded into the process.
+// Each module that logs holds one client, under its own module name.
 #pragma once
 
 #include <cstdarg>
@@ -10,6 +11,8 @@ struct KalbTraceObject;
 
 class KalbLogClient {
 public:
+    enum Level { Failure = 2, Trace = 5 };
+
     // Registers moduleName with the library; it stays loaded until this object is destroyed.
     explicit KalbLogClient(const char* moduleName);
     ~KalbLogClient();
@@ -17,7 +20,14 @@ public:
     KalbLogClient(const KalbLogClient&) = delete;
     KalbLogClient& operator=(const KalbLogClient&) = delete;
 
-    void print(int level, const char* sourceFile, int line, const char* format, va_list args) const;
+    // printf-style format; sourceFile (from the repository's top) and line go to the filter.
+    void print(int level, const char* sourceFile, int line, const char* format, ...) const
+#if defined(__GNUC__)
+        __attribute__((format(printf, 5, 6)))
+#endif
+        ;
+    void vprint(int level, const char* sourceFile, int line, const char* format,
+                va_list args) const;
 
 private:
     void* handle = nullptr;

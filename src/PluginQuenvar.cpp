@@ -3,9 +3,9 @@
 #include "DeliveryGate.h"
 #include "PluginQuenvarDefs.h"
 #include "QUILImplementation/VcaRuleRetriever.h"
+#include "QuenvarLog.h"
 #include "ScopedTrace.h"
 #include "SubscriberList.h"
-#include "TraceLog.h"
 #include "camera/CameraProxy.h"
 
 #include <QTimer>
@@ -38,10 +38,10 @@ std::function<void(bool, const QVariant&)> presetAdapter(const ResponseCallback&
                                                          const QVariantMap& params) {
     return [callback, host = params.value(KEY_HOST).toString()](bool ok, const QVariant& result) {
         if (!ok)
-            TraceLog::print(TraceLog::Failure, SOURCE_FILE, __LINE__,
-                            "Go to SmartTrackingAdv preset failed,  ip: %s, response: %s",
-                            host.toLocal8Bit().constData(),
-                            result.toString().toLocal8Bit().constData());
+            quenvarLog.print(KalbLogClient::Failure, SOURCE_FILE, __LINE__,
+                             "Go to SmartTrackingAdv preset failed,  ip: %s, response: %s",
+                             host.toLocal8Bit().constData(),
+                             result.toString().toLocal8Bit().constData());
         answer(callback, ok, result);
     };
 }
@@ -50,10 +50,10 @@ std::function<void(bool, QList<QString>)> presetListAdapter(const ResponseCallba
                                                             const QVariantMap& params) {
     return [callback, host = params.value(KEY_HOST).toString()](bool ok, QList<QString> presets) {
         if (!ok)
-            TraceLog::print(TraceLog::Failure, SOURCE_FILE, __LINE__,
-                            "get SmartTrackingAdv preset list failed, ip: %s, response: %s",
-                            host.toLocal8Bit().constData(),
-                            presets.join(QLatin1Char(',')).toLocal8Bit().constData());
+            quenvarLog.print(KalbLogClient::Failure, SOURCE_FILE, __LINE__,
+                             "get SmartTrackingAdv preset list failed, ip: %s, response: %s",
+                             host.toLocal8Bit().constData(),
+                             presets.join(QLatin1Char(',')).toLocal8Bit().constData());
         answer(callback, ok, QVariant(QStringList(presets)));
     };
 }
@@ -175,11 +175,11 @@ void PluginQuenvar::Request(const QString& command, const QVariant& params,
             return;
         }
     } catch (const std::exception& error) {
-        TraceLog::print(TraceLog::Failure, SOURCE_FILE, __LINE__, "%s, failed, %s",
-                        "PluginQuenvar::Request", error.what());
+        quenvarLog.print(KalbLogClient::Failure, SOURCE_FILE, __LINE__, "%s, failed, %s",
+                         "PluginQuenvar::Request", error.what());
     } catch (...) {
-        TraceLog::print(TraceLog::Failure, SOURCE_FILE, __LINE__, "%s, failed",
-                        "PluginQuenvar::Request");
+        quenvarLog.print(KalbLogClient::Failure, SOURCE_FILE, __LINE__, "%s, failed",
+                         "PluginQuenvar::Request");
     }
 }
 

@@ -1,13 +1,13 @@
 #include "ScopedTrace.h"
 
-#include "TraceLog.h"
+#include "QuenvarLog.h"
 
 ScopedTrace::ScopedTrace(const char* function, const char* sourceFile, int line)
     : function(function)
     , sourceFile(sourceFile) {
-    TraceLog::print(TraceLog::Trace, sourceFile, line, "%s, Enter", function);
+    quenvarLog.print(KalbLogClient::Trace, sourceFile, line, "%s, Enter", function);
 }
 
 ScopedTrace::~ScopedTrace() {
-    TraceLog::print(TraceLog::Trace, sourceFile, 0, "%s, Leave", function);
+    quenvarLog.print(KalbLogClient::Trace, sourceFile, 0, "%s, Leave", function);
 }

@@ -40,10 +40,10 @@ int EventHub::deliver(const PluginObjBase_EventInfoBase* record) {
     }
     for (const std::shared_ptr<EventQueue>& queue : targets)
         queue->push(event);
-    HostLog::trace(__FILE__, __LINE__,
-                   QStringLiteral("event %1 for subscriber %2: %3 stream(s)")
-                       .arg(event.eventName, event.subscriberId)
-                       .arg(targets.size()));
+    hostLog().print(KalbLogClient::Trace, __FILE__, __LINE__, "%s",
+                    qUtf8Printable(QStringLiteral("event %1 for subscriber %2: %3 stream(s)")
+                                       .arg(event.eventName, event.subscriberId)
+                                       .arg(targets.size())));
     return static_cast<int>(targets.size());
 }
 

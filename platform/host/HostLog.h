@@ -1,11 +1,8 @@
 #pragma once
 
-#include <QString>
+#include "KalbLogClient.h"
 
-// The host's messages. Warnings are for the user and always go to standard error; traces go
-// through the logging library at level 5 (shown with KALBLOG_LEVEL=5, which --verbose sets).
-class HostLog {
-public:
-    static void warning(const QString& message);
-    static void trace(const char* sourceFile, int line, const QString& message);
-};
+// The host's logging client, module "QuenvarHost": failures at level 2 (shown by default, on
+// standard error or in KALBLOG_FILE), traces at level 5 (--verbose). Made on first use, after
+// main has set KALBLOG_LEVEL.
+const KalbLogClient& hostLog();

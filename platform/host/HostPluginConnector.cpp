@@ -20,25 +20,31 @@ bool HostPluginConnector::ConnectPluginSignal(const QString& pluginId, const cha
                                               int connectionType) {
     const LoadedPlugin* source = host.plugin(pluginId);
     if (!source) {
-        HostLog::warning(QStringLiteral("cannot connect %1 of plugin %2: no plugin with that id")
-                             .arg(signature(signal), pluginId));
+        hostLog().print(
+            KalbLogClient::Failure, __FILE__, __LINE__, "%s",
+            qUtf8Printable(QStringLiteral("cannot connect %1 of plugin %2: no plugin with that id")
+                               .arg(signature(signal), pluginId)));
         return false;
     }
     if (!signal || !receiver || !method) {
-        HostLog::warning(QStringLiteral("cannot connect %1 of plugin %2: no receiver or method")
-                             .arg(signature(signal), pluginId));
+        hostLog().print(
+            KalbLogClient::Failure, __FILE__, __LINE__, "%s",
+            qUtf8Printable(QStringLiteral("cannot connect %1 of plugin %2: no receiver or method")
+                               .arg(signature(signal), pluginId)));
         return false;
     }
     const bool connected = static_cast<bool>(QObject::connect(
         source->object, signal, receiver, method, static_cast<Qt::ConnectionType>(connectionType)));
     if (!connected) {
-        HostLog::warning(QStringLiteral("cannot connect %1 of plugin %2 to %3 of %4")
-                             .arg(signature(signal), pluginId, signature(method),
-                                  QString::fromLatin1(receiver->metaObject()->className())));
+        hostLog().print(
+            KalbLogClient::Failure, __FILE__, __LINE__, "%s",
+            qUtf8Printable(QStringLiteral("cannot connect %1 of plugin %2 to %3 of %4")
+                               .arg(signature(signal), pluginId, signature(method),
+                                    QString::fromLatin1(receiver->metaObject()->className()))));
     } else {
-        HostLog::trace(__FILE__, __LINE__,
-                       QStringLiteral("connected %1 of plugin %2 to %3")
-                           .arg(signature(signal), pluginId, signature(method)));
+        hostLog().print(KalbLogClient::Trace, __FILE__, __LINE__, "%s",
+                        qUtf8Printable(QStringLiteral("connected %1 of plugin %2 to %3")
+                                           .arg(signature(signal), pluginId, signature(method))));
     }
     return connected;
 }

@@ -32,10 +32,10 @@ bool HostRequestChannel::SendRequest(const QString& pluginID, Context context, i
     QObject* mainThread = host.context();
     const LoadedPlugin* target = host.pluginServing(command);
     if (!target) {
-        HostLog::trace(__FILE__, __LINE__,
-                       QStringLiteral("request %1 %2 from %3: no plugin serves it")
-                           .arg(number)
-                           .arg(command, pluginID));
+        hostLog().print(KalbLogClient::Trace, __FILE__, __LINE__, "%s",
+                        qUtf8Printable(QStringLiteral("request %1 %2 from %3: no plugin serves it")
+                                           .arg(number)
+                                           .arg(command, pluginID)));
         QMetaObject::invokeMethod(
             mainThread,
             [routed]() {
@@ -46,12 +46,12 @@ bool HostRequestChannel::SendRequest(const QString& pluginID, Context context, i
         return false;
     }
 
-    HostLog::trace(__FILE__, __LINE__,
-                   QStringLiteral("request %1 %2 (kind %3) from %4 to %5")
-                       .arg(number)
-                       .arg(command)
-                       .arg(kind)
-                       .arg(pluginID, target->id));
+    hostLog().print(KalbLogClient::Trace, __FILE__, __LINE__, "%s",
+                    qUtf8Printable(QStringLiteral("request %1 %2 (kind %3) from %4 to %5")
+                                       .arg(number)
+                                       .arg(command)
+                                       .arg(kind)
+                                       .arg(pluginID, target->id)));
     const QDeadlineTimer deadline(info.timeoutMs > 0 ? info.timeoutMs : DEFAULT_TIMEOUT_MS);
     const RequestSenderInfo sender{pluginID.isEmpty() ? ownerId : pluginID, QString()};
     IPluginObjectBase* object = target->object;
@@ -61,14 +61,15 @@ bool HostRequestChannel::SendRequest(const QString& pluginID, Context context, i
         mainThread,
         [=]() {
             // Precise: a coarse timer may fire up to 5% before the record's time-out.
-            QTimer::singleShot(std::max<qint64>(deadline.remainingTime(), 0), Qt::PreciseTimer,
-                               mainThread, [routed, number]() {
-                                   if (routed->deliver(false, QStringLiteral("timeout"), QString(),
-                                                       STATUS_TIMEOUT, QString(), false))
-                                       HostLog::trace(
-                                           __FILE__, __LINE__,
-                                           QStringLiteral("request %1 timed out").arg(number));
-                               });
+            QTimer::singleShot(
+                std::max<qint64>(deadline.remainingTime(), 0), Qt::PreciseTimer, mainThread,
+                [routed, number]() {
+                    if (routed->deliver(false, QStringLiteral("timeout"), QString(), STATUS_TIMEOUT,
+                                        QString(), false))
+                        hostLog().print(
+                            KalbLogClient::Trace, __FILE__, __LINE__, "%s",
+                            qUtf8Printable(QStringLiteral("request %1 timed out").arg(number)));
+                });
             // A plugin that throws is left to the time-out: the exception must not reach the
             // event loop.
             try {
@@ -79,8 +80,9 @@ bool HostRequestChannel::SendRequest(const QString& pluginID, Context context, i
                         routed->deliver(true, message, targetId, code, payload.toString(), handled);
                     });
             } catch (...) {
-                HostLog::warning(
-                    QStringLiteral("plugin %1 failed on the command %2").arg(targetId, command));
+                hostLog().print(KalbLogClient::Failure, __FILE__, __LINE__, "%s",
+                                qUtf8Printable(QStringLiteral("plugin %1 failed on the command %2")
+                                                   .arg(targetId, command)));
             }
         },
         Qt::QueuedConnection);

@@ -44,7 +44,9 @@ PluginHost::~PluginHost() {
 int PluginHost::loadFolder(const QString& folder) {
     const QDir dir(folder);
     if (!dir.exists()) {
-        HostLog::warning(QStringLiteral("plugin folder %1 does not exist").arg(folder));
+        hostLog().print(
+            KalbLogClient::Failure, __FILE__, __LINE__, "%s",
+            qUtf8Printable(QStringLiteral("plugin folder %1 does not exist").arg(folder)));
         return 0;
     }
     int count = 0;
@@ -55,36 +57,45 @@ int PluginHost::loadFolder(const QString& folder) {
         auto loader = std::make_unique<QPluginLoader>(path);
         const QJsonObject metaData = loader->metaData();
         if (metaData.isEmpty()) {
-            HostLog::warning(QStringLiteral("skipping %1: not a Qt plugin (%2)")
-                                 .arg(fileName(path), loader->errorString()));
+            hostLog().print(KalbLogClient::Failure, __FILE__, __LINE__, "%s",
+                            qUtf8Printable(QStringLiteral("skipping %1: not a Qt plugin (%2)")
+                                               .arg(fileName(path), loader->errorString())));
             continue;
         }
         const QString iid = metaData.value(QStringLiteral("IID")).toString();
         if (iid != QStringLiteral(QUENVAR_PLUGIN_INTERFACE_IID)) {
-            HostLog::warning(
-                QStringLiteral("skipping %1: its interface is \"%2\", not \"%3\"")
-                    .arg(fileName(path), iid, QStringLiteral(QUENVAR_PLUGIN_INTERFACE_IID)));
+            hostLog().print(
+                KalbLogClient::Failure, __FILE__, __LINE__, "%s",
+                qUtf8Printable(
+                    QStringLiteral("skipping %1: its interface is \"%2\", not \"%3\"")
+                        .arg(fileName(path), iid, QStringLiteral(QUENVAR_PLUGIN_INTERFACE_IID))));
             continue;
         }
         const QString id = pluginIdOf(metaData);
         if (id.isEmpty()) {
-            HostLog::warning(
-                QStringLiteral("skipping %1: its metadata has no PluginID").arg(fileName(path)));
+            hostLog().print(
+                KalbLogClient::Failure, __FILE__, __LINE__, "%s",
+                qUtf8Printable(QStringLiteral("skipping %1: its metadata has no PluginID")
+                                   .arg(fileName(path))));
             continue;
         }
         if (const LoadedPlugin* other = plugin(id)) {
-            HostLog::warning(QStringLiteral("skipping %1: PluginID %2 is already loaded from %3")
-                                 .arg(fileName(path), id, fileName(other->origin)));
+            hostLog().print(
+                KalbLogClient::Failure, __FILE__, __LINE__, "%s",
+                qUtf8Printable(QStringLiteral("skipping %1: PluginID %2 is already loaded from %3")
+                                   .arg(fileName(path), id, fileName(other->origin))));
             continue;
         }
         QObject* instance = loader->instance();
         auto* object = qobject_cast<IPluginObjectBase*>(instance);
         if (!object) {
-            HostLog::warning(QStringLiteral("skipping %1: %2")
-                                 .arg(fileName(path),
-                                      instance ? QStringLiteral("its instance does not implement "
-                                                                "the plugin interface")
-                                               : loader->errorString()));
+            hostLog().print(
+                KalbLogClient::Failure, __FILE__, __LINE__, "%s",
+                qUtf8Printable(QStringLiteral("skipping %1: %2")
+                                   .arg(fileName(path),
+                                        instance ? QStringLiteral("its instance does not implement "
+                                                                  "the plugin interface")
+                                                 : loader->errorString())));
             if (instance)
                 loader->unload();
             continue;
@@ -124,15 +135,19 @@ bool PluginHost::admit(std::unique_ptr<LoadedPlugin> plugin) {
         if (name.isEmpty())
             continue;
         if (const LoadedPlugin* other = pluginServing(name)) {
-            HostLog::warning(QStringLiteral("plugin %1 also lists the command %2, which %3 serves")
-                                 .arg(plugin->id, name, other->id));
+            hostLog().print(
+                KalbLogClient::Failure, __FILE__, __LINE__, "%s",
+                qUtf8Printable(
+                    QStringLiteral("plugin %1 also lists the command %2, which %3 serves")
+                        .arg(plugin->id, name, other->id)));
             continue;
         }
         plugin->commands.append(name);
     }
-    HostLog::trace(__FILE__, __LINE__,
-                   QStringLiteral("loaded plugin %1 from %2, commands: %3")
-                       .arg(plugin->id, plugin->origin, plugin->commands.join(QLatin1Char(','))));
+    hostLog().print(KalbLogClient::Trace, __FILE__, __LINE__, "%s",
+                    qUtf8Printable(QStringLiteral("loaded plugin %1 from %2, commands: %3")
+                                       .arg(plugin->id, plugin->origin,
+                                            plugin->commands.join(QLatin1Char(',')))));
     loaded.push_back(std::move(plugin));
     return true;
 }
@@ -141,8 +156,10 @@ void PluginHost::start() {
     for (const auto& plugin : loaded) {
         tools.push_back(std::make_unique<HostFrameworkTools>(*this, plugin->id));
         if (!plugin->object->InitialPluginBase(tools.back().get()))
-            HostLog::warning(
-                QStringLiteral("plugin %1 reported a failed initialisation").arg(plugin->id));
+            hostLog().print(
+                KalbLogClient::Failure, __FILE__, __LINE__, "%s",
+                qUtf8Printable(
+                    QStringLiteral("plugin %1 reported a failed initialisation").arg(plugin->id)));
     }
     for (const auto& plugin : loaded)
         plugin->object->AllPluginLoaded();
@@ -176,7 +193,8 @@ std::shared_ptr<EventQueue> PluginHost::openEventStream(const QString& subscribe
     auto queue = std::make_shared<EventQueue>();
     std::lock_guard<std::mutex> lock(subscriptionMutex);
     if (hub.attach(subscriberId, queue)) {
-        HostLog::trace(__FILE__, __LINE__, QStringLiteral("subscribing %1").arg(subscriberId));
+        hostLog().print(KalbLogClient::Trace, __FILE__, __LINE__, "%s",
+                        qUtf8Printable(QStringLiteral("subscribing %1").arg(subscriberId)));
         NullResponser responser;
         for (const auto& plugin : loaded)
             plugin->object->SubscribeEventBlock(subscriberId, QString(), QVariant(), sender,
@@ -189,7 +207,8 @@ void PluginHost::closeEventStream(const QString& subscriberId,
                                   const std::shared_ptr<EventQueue>& queue) {
     std::lock_guard<std::mutex> lock(subscriptionMutex);
     if (hub.detach(subscriberId, queue)) {
-        HostLog::trace(__FILE__, __LINE__, QStringLiteral("unsubscribing %1").arg(subscriberId));
+        hostLog().print(KalbLogClient::Trace, __FILE__, __LINE__, "%s",
+                        qUtf8Printable(QStringLiteral("unsubscribing %1").arg(subscriberId)));
         NullResponser responser;
         for (const auto& plugin : loaded)
             plugin->object->UnsubscribeEventBlock(subscriberId, QVariant(), responser);

@@ -35,7 +35,7 @@ int serve(PluginHost& host, IPluginObjectBase& plugin, const HostOptions& option
     HttpFront front(host, plugin);
     QString error;
     if (!front.listen(options.listenHost, options.listenPort, &error)) {
-        HostLog::warning(error);
+        hostLog().print(KalbLogClient::Failure, __FILE__, __LINE__, "%s", qUtf8Printable(error));
         return EXIT_FAILED;
     }
     print(stdout,
@@ -80,8 +80,10 @@ int main(int argc, char** argv) {
     host.loadFolder(pluginDir);
     const LoadedPlugin* quenvar = host.plugin(QUENVAR_PLUGIN_ID);
     if (!quenvar) {
-        HostLog::warning(QStringLiteral("no PluginQuenvar (PluginID %1) in the plugin folder %2")
-                             .arg(QUENVAR_PLUGIN_ID, pluginDir));
+        hostLog().print(
+            KalbLogClient::Failure, __FILE__, __LINE__, "%s",
+            qUtf8Printable(QStringLiteral("no PluginQuenvar (PluginID %1) in the plugin folder %2")
+                               .arg(QUENVAR_PLUGIN_ID, pluginDir)));
         return EXIT_USAGE;
     }
     host.start();

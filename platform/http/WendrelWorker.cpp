@@ -77,8 +77,8 @@ WendrelWorker::WendrelWorker(const WendrelTlsSettings& tls)
     deadlineTimer.setTimerType(Qt::PreciseTimer);
     connect(&deadlineTimer, &QTimer::timeout, this, &WendrelWorker::expireDeadlines);
     if (insecure)
-        WendrelLog::failure(__FILE__, __LINE__,
-                            "TLS certificate verification is off: any server is trusted");
+        wendrelLog().print(KalbLogClient::Failure, __FILE__, __LINE__,
+                           "TLS certificate verification is off: any server is trusted");
 }
 
 void WendrelWorker::start(WendrelRequest request) {
@@ -144,8 +144,8 @@ const std::optional<QSslConfiguration>& WendrelWorker::tlsConfiguration() {
     } else if (!caFile.isEmpty()) {
         const QList<QSslCertificate> extra = QSslCertificate::fromPath(caFile, QSsl::Pem);
         if (extra.isEmpty())
-            WendrelLog::failure(__FILE__, __LINE__, "no PEM certificate read from CA file %s",
-                                qPrintable(caFile));
+            wendrelLog().print(KalbLogClient::Failure, __FILE__, __LINE__,
+                               "no PEM certificate read from CA file %s", qPrintable(caFile));
         // Adding certificates stops Qt's on-demand loading of the system's roots: keep them.
         QSslConfiguration configuration = QSslConfiguration::defaultConfiguration();
         configuration.setCaCertificates(QSslConfiguration::systemCaCertificates() + extra);
@@ -389,7 +389,7 @@ void WendrelWorker::answer(const HttpReplyCallback& callback, QNetworkReply::Net
     try {
         callback(error, headers, body, reachedServer);
     } catch (...) {
-        WendrelLog::failure(__FILE__, __LINE__,
-                            "a reply callback threw; the exception was dropped");
+        wendrelLog().print(KalbLogClient::Failure, __FILE__, __LINE__,
+                           "a reply callback threw; the exception was dropped");
     }
 }

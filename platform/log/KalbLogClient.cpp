@@ -101,7 +101,15 @@ KalbLogClient::~KalbLogClient() {
 }
 
 void KalbLogClient::print(int level, const char* sourceFile, int line, const char* format,
-                          va_list args) const {
+                          ...) const {
+    va_list args;
+    va_start(args, format);
+    vprint(level, sourceFile, line, format, args);
+    va_end(args);
+}
+
+void KalbLogClient::vprint(int level, const char* sourceFile, int line, const char* format,
+                           va_list args) const {
     const KalbTraceObject* object = traceObject;
     if (!object || !object->context || !object->Filter)
         return;

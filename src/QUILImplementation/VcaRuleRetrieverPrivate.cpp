@@ -2,7 +2,7 @@
 
 #include "PluginQuenvarDefs.h"
 #include "QUILImplementation/JsonNormaliser.h"
-#include "TraceLog.h"
+#include "QuenvarLog.h"
 #include "Trindle.h"
 
 #include <QByteArray>
@@ -110,10 +110,10 @@ void guarded(const char* tag, Handler&& handler) {
     try {
         handler();
     } catch (const std::exception& error) {
-        TraceLog::print(TraceLog::Failure, SOURCE_FILE, __LINE__, "%s, failed, %s", tag,
-                        error.what());
+        quenvarLog.print(KalbLogClient::Failure, SOURCE_FILE, __LINE__, "%s, failed, %s", tag,
+                         error.what());
     } catch (...) {
-        TraceLog::print(TraceLog::Failure, SOURCE_FILE, __LINE__, "%s, failed", tag);
+        quenvarLog.print(KalbLogClient::Failure, SOURCE_FILE, __LINE__, "%s, failed", tag);
     }
 }
 
@@ -194,8 +194,9 @@ void VcaRuleRetriever::VcaRuleRetrieverPrivate::queryLiveVCARuleCB(
     bool flag, const ResponseCallback& callback) {
     const bool failed = replyFailed(success, statusCode);
     if (failed)
-        TraceLog::print(TraceLog::Failure, SOURCE_FILE, __LINE__, "%s, getLiveVcaRule failed, %s",
-                        "getLiveVcaRule", statusCode.toLocal8Bit().constData());
+        quenvarLog.print(KalbLogClient::Failure, SOURCE_FILE, __LINE__,
+                         "%s, getLiveVcaRule failed, %s", "getLiveVcaRule",
+                         statusCode.toLocal8Bit().constData());
     // A failed fetch still carries the converted map: subscribers of change events get it.
     answer(callback, flag, !failed, QVariant(convertLiveReply(replyText, relayPath)));
 }
@@ -204,17 +205,17 @@ void VcaRuleRetriever::VcaRuleRetrieverPrivate::queryRecordingVCARuleCB(
     bool success, const QString& statusCode, const QString& replyText, bool flag,
     const ResponseCallback& callback) {
     if (replyFailed(success, statusCode)) {
-        TraceLog::print(TraceLog::Failure, SOURCE_FILE, RECORDING_STATUS_FAILURE_LINE,
-                        "%s, queryRecordingVCARuleCB failed, %s", "queryRecordingVCARuleCB",
-                        statusCode.toLocal8Bit().constData());
+        quenvarLog.print(KalbLogClient::Failure, SOURCE_FILE, RECORDING_STATUS_FAILURE_LINE,
+                         "%s, queryRecordingVCARuleCB failed, %s", "queryRecordingVCARuleCB",
+                         statusCode.toLocal8Bit().constData());
         answer(callback, flag, false, QVariant());
         return;
     }
     const QVariant result = convertRecordingReply(replyText);
     if (!result.isValid()) {
-        TraceLog::print(TraceLog::Failure, SOURCE_FILE, RECORDING_PARSE_FAILURE_LINE,
-                        "%s, parse message failed, %s", "queryRecordingVCARuleCB",
-                        replyText.toLocal8Bit().constData());
+        quenvarLog.print(KalbLogClient::Failure, SOURCE_FILE, RECORDING_PARSE_FAILURE_LINE,
+                         "%s, parse message failed, %s", "queryRecordingVCARuleCB",
+                         replyText.toLocal8Bit().constData());
         answer(callback, flag, false, QVariant());
         return;
     }

@@ -333,21 +333,25 @@ TEST_F(HostEndToEndTest, SkipsPluginsItCannotUseAndAnswersWithoutTheVcaPlugin) {
               canonical(R"({"handled":false,"code":"-1","message":"","payload":)" +
                         livePayload("", false, EMPTY_XML_RULES, "") + "}")
                   .toStdString());
+    // The host's failures, at the logging library's default level, without file and line.
     QStringList warnings;
+    const QRegularExpression failure(
+        QStringLiteral(R"(\[QuenvarHost\] L2 platform/host/\S+ (.*))"));
     for (const QString& line : run.errors.split('\n')) {
-        if (line.startsWith("quenvar-host: "))
-            warnings << line.section(" (", 0, 0);
+        const QRegularExpressionMatch match = failure.match(line);
+        if (match.hasMatch())
+            warnings << match.captured(1).section(" (", 0, 0);
     }
     EXPECT_EQ(lines(warnings),
-              lines({"quenvar-host: skipping libBroken.so: not a Qt plugin",
-                     "quenvar-host: skipping libForeignPlugin.so: its interface is "
+              lines({"skipping libBroken.so: not a Qt plugin",
+                     "skipping libForeignPlugin.so: its interface is "
                      "\"org.example.OtherHost.Interface\", not "
                      "\"com.MERIDOX.PluginServer.PluginInterface\"",
-                     "quenvar-host: skipping libNoIdPlugin.so: its metadata has no PluginID",
-                     "quenvar-host: skipping libPluginQuenvarCopy.so: PluginID " + QUENVAR_ID +
+                     "skipping libNoIdPlugin.so: its metadata has no PluginID",
+                     "skipping libPluginQuenvarCopy.so: PluginID " + QUENVAR_ID +
                          " is already loaded from libPluginQuenvar.so",
-                     "quenvar-host: cannot connect vcaMetadataChanged(const QString &) of plugin " +
-                         VCA_ID + ": no plugin with that id"}));
+                     "cannot connect vcaMetadataChanged(const QString &) of plugin " + VCA_ID +
+                         ": no plugin with that id"}));
     EXPECT_TRUE(run.errors.contains("GetVCARules from " + QUENVAR_ID + ": no plugin serves it"))
         << qPrintable(run.errors);
 }

@@ -1,0 +1,3 @@
+#include "QuenvarLog.h"
+
+const KalbLogClient quenvarLog("Quenvar");
