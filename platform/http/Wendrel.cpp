@@ -23,8 +23,9 @@ WendrelRequest makeRequest(const QByteArray& method, const QUrl& url, const QByt
     request.user = user;
     request.password = password;
     request.callback = std::move(callback);
+    request.submitted = WendrelRequest::Clock::now();
     if (timeout != 0)
-        request.deadline = WendrelRequest::Clock::now() + std::chrono::milliseconds(timeout);
+        request.deadline = request.submitted + std::chrono::milliseconds(timeout);
     return request;
 }
 

@@ -1,17 +1,14 @@
 #include "WendrelConnection.h"
 
+#include <QCryptographicHash>
 #include <QNetworkProxy>
+#include <QSslCertificate>
 #include <QSslSocket>
 #include <QTcpSocket>
 
-#include <climits>
 #include <utility>
 
 namespace {
-
-WendrelConnection* ownerOf(http_parser* parser) {
-    return static_cast<WendrelConnection*>(parser->data);
-}
 
 // As Qt's HTTP connections map them.
 QNetworkReply::NetworkError networkError(QAbstractSocket::SocketError error) {
@@ -31,31 +28,44 @@ QNetworkReply::NetworkError networkError(QAbstractSocket::SocketError error) {
     }
 }
 
-} // namespace
+bool legal(WendrelConnection::State from, WendrelConnection::State to) {
+    using State = WendrelConnection::State;
+    switch (from) {
+    case State::Connecting:
+        return to == State::Writing || to == State::Idle || to == State::Closed;
+    case State::Idle:
+        return to == State::Writing || to == State::Closed;
+    case State::Writing:
+        return to == State::Reading || to == State::Closed;
+    case State::Reading:
+        return to == State::Idle || to == State::Closed;
+    case State::Closed:
+        return false;
+    }
+    return false;
+}
 
-const http_parser_settings WendrelConnection::settings = [] {
-    http_parser_settings result;
-    http_parser_settings_init(&result);
-    result.on_message_begin = &WendrelConnection::onMessageBegin;
-    result.on_header_field = &WendrelConnection::onHeaderField;
-    result.on_header_value = &WendrelConnection::onHeaderValue;
-    result.on_headers_complete = &WendrelConnection::onHeadersComplete;
-    result.on_body = &WendrelConnection::onBody;
-    result.on_message_complete = &WendrelConnection::onMessageComplete;
-    return result;
-}();
+QByteArray describe(const QSslCertificate& certificate) {
+    return "subject " + WendrelFailure::peerText(certificate.subjectDisplayName().toUtf8()) +
+           ", issuer " + WendrelFailure::peerText(certificate.issuerDisplayName().toUtf8()) +
+           ", SHA-256 " + certificate.digest(QCryptographicHash::Sha256).toHex(':');
+}
+
+} // namespace
 
 WendrelConnection::WendrelConnection(const QString& host, quint16 port, bool https,
                                      const std::optional<QSslConfiguration>& tls,
                                      qint64 maxBodySize, Dropped dropped, QObject* parent)
     : QObject(parent)
-    , maxBodySize(maxBodySize)
-    , dropped(std::move(dropped)) {
+    , dropped(std::move(dropped))
+    , reader(WendrelResponseReader::defaultMaxHeaderSize, maxBodySize) {
     if (https) {
         auto* ssl = new QSslSocket(this);
         if (tls)
             ssl->setSslConfiguration(*tls);
+        ssl->setReadBufferSize(readChunkSize);
         // Certificate errors are not ignored: the handshake fails with SslHandshakeFailedError.
+        connect(ssl, &QSslSocket::sslErrors, this, &WendrelConnection::recordTlsErrors);
         connect(ssl, &QSslSocket::encrypted, this, &WendrelConnection::connected);
         socket = ssl;
     } else {
@@ -65,13 +75,17 @@ WendrelConnection::WendrelConnection(const QString& host, quint16 port, bool htt
     socket->setProxy(QNetworkProxy::NoProxy);
     connect(socket, &QIODevice::readyRead, this, &WendrelConnection::read);
     connect(socket, &QIODevice::bytesWritten, this, &WendrelConnection::written);
-    connect(socket, &QAbstractSocket::errorOccurred, this, &WendrelConnection::failed);
-    connect(socket, &QAbstractSocket::disconnected, this, &WendrelConnection::endOfInput);
+    // Qt may report a failure inside a call such as write(); it is handled from the event loop,
+    // by which time the state says whose it is.
+    connect(socket, &QAbstractSocket::errorOccurred, this, &WendrelConnection::failed,
+            Qt::QueuedConnection);
+    connect(socket, &QAbstractSocket::disconnected, this, &WendrelConnection::endOfInput,
+            Qt::QueuedConnection);
     // From the event loop: a failure to connect is then never reported inside the caller.
     QMetaObject::invokeMethod(
         this,
         [this, host, port] {
-            if (closed)
+            if (current == State::Closed)
                 return;
             if (auto* ssl = qobject_cast<QSslSocket*>(socket))
                 ssl->connectToHostEncrypted(host, port);
@@ -83,23 +97,21 @@ WendrelConnection::WendrelConnection(const QString& host, quint16 port, bool htt
 }
 
 void WendrelConnection::send(const QByteArray& message, Finished done) {
+    Q_ASSERT(current == State::Connecting || current == State::Idle);
+    Q_ASSERT(!finished);
     finished = std::move(done);
-    answer = Answer();
-    answer.connectionReused = exchanges > 0;
-    answer.headers.reserve(256);
-    readingField = readingValue = interim = complete = tooLarge = keepAlive = failedWhileWriting =
-        false;
-    http_parser_init(&parser, HTTP_RESPONSE);
-    parser.data = this;
-    unwritten = message.size();
-    if (isConnected)
+    reader.reset();
+    surplus = false;
+    if (current == State::Idle)
         write(message);
     else
         pendingMessage = message;
 }
 
 void WendrelConnection::close() {
-    closed = true;
+    if (current == State::Closed)
+        return;
+    current = State::Closed;
     finished = nullptr;
     dropped = nullptr;
     disconnect(socket, nullptr, this, nullptr);
@@ -107,218 +119,214 @@ void WendrelConnection::close() {
     deleteLater();
 }
 
+bool WendrelConnection::reachedServer() const {
+    return current == State::Reading || reader.began();
+}
+
+QByteArray WendrelConnection::activity() const {
+    switch (current) {
+    case State::Connecting:
+        return qobject_cast<QSslSocket*>(socket) ? "connecting (TCP and TLS)" : "connecting";
+    case State::Writing:
+        return "sending the request";
+    case State::Reading:
+        return reader.began() ? "reading the answer" : "waiting for the answer";
+    case State::Idle:
+    case State::Closed:
+        break;
+    }
+    return "between requests";
+}
+
+void WendrelConnection::setState(State next) {
+    Q_ASSERT(legal(current, next));
+    current = next;
+}
+
 void WendrelConnection::write(const QByteArray& message) {
-    // Written at once rather than on the next turn of the event loop. A failure is then reported
-    // by Qt inside this call; it is answered from the event loop instead, never inside send().
-    writing = true;
-    const bool queued = socket->write(message) == message.size();
-    socket->flush();
-    writing = false;
-    if (queued && socket->bytesToWrite() == 0)
-        answer.reachedServer = true;
-    if (!queued || failedWhileWriting)
+    setState(State::Writing);
+    // Written at once rather than on the next turn of the event loop.
+    if (socket->write(message) != message.size()) {
+        // A socket that Qt already found closed reports nothing more: say so from the loop.
         QMetaObject::invokeMethod(
             this,
-            [this, exchange = exchanges,
-             error = failedWhileWriting ? failedWith : QNetworkReply::RemoteHostClosedError] {
-                if (finished && exchanges == exchange)
-                    finish(error);
+            [this, exchange = exchanges] {
+                if (current == State::Writing && exchanges == exchange)
+                    finish({QNetworkReply::RemoteHostClosedError,
+                            "connection closed before the request went out"});
             },
             Qt::QueuedConnection);
+        return;
+    }
+    socket->flush();
+    written();
 }
 
 void WendrelConnection::connected() {
-    isConnected = true;
     socket->setSocketOption(QAbstractSocket::LowDelayOption, 1);
-    if (!pendingMessage.isEmpty())
+    if (current != State::Connecting)
+        return;
+    if (pendingMessage.isEmpty())
+        setState(State::Idle);
+    else
         write(std::exchange(pendingMessage, QByteArray()));
 }
 
 void WendrelConnection::read() {
-    const QByteArray data = socket->readAll();
-    // An unbuffered socket that reads the end of its input says so only through its state.
-    const bool ended = socket->state() == QAbstractSocket::UnconnectedState;
-    if (!finished) {
-        // Nothing may arrive between exchanges.
-        if ((!data.isEmpty() || ended) && dropped)
+    if (current == State::Idle) {
+        // Nothing may arrive between exchanges, and the end of the input drops it too.
+        char probe;
+        if (socket->read(&probe, 1) != 0 && dropped)
             dropped(this);
         return;
     }
-    feed(data.constData(), data.size());
-    if (ended && finished)
+    if ((current == State::Writing || current == State::Reading) && pull() == Pull::Ended)
         endOfInput();
 }
 
-void WendrelConnection::written(qint64 bytes) {
-    if (!finished || unwritten <= 0)
-        return;
-    unwritten -= bytes;
-    if (unwritten <= 0)
-        answer.reachedServer = true;
+WendrelConnection::Pull WendrelConnection::pull() {
+    // One buffer per thread: connections hold no read buffer of their own.
+    static thread_local char buffer[readChunkSize];
+    while (current == State::Writing || current == State::Reading) {
+        const qint64 size = socket->read(buffer, readChunkSize);
+        if (size == 0)
+            return Pull::Waiting;
+        // An unbuffered socket that reads the end of its input says so only this way.
+        if (size < 0)
+            return Pull::Ended;
+        const qsizetype used = reader.feed(buffer, qsizetype(size));
+        if (reader.state() != WendrelResponseReader::State::Reading) {
+            answerRead(used, qsizetype(size));
+            break;
+        }
+    }
+    return Pull::Done;
+}
+
+void WendrelConnection::written() {
+    if (current == State::Writing && socket->bytesToWrite() == 0)
+        setState(State::Reading);
 }
 
 void WendrelConnection::failed() {
     const QAbstractSocket::SocketError error = socket->error();
-    if (error == QAbstractSocket::RemoteHostClosedError)
+    if (error == QAbstractSocket::RemoteHostClosedError) {
         endOfInput();
-    else if (!handledElsewhere(networkError(error)))
-        finish(networkError(error));
-}
-
-// A failure inside write() is answered by write(); one between exchanges drops the connection.
-bool WendrelConnection::handledElsewhere(QNetworkReply::NetworkError error) {
-    if (writing) {
-        failedWhileWriting = true;
-        failedWith = error;
-        return true;
-    }
-    if (!finished) {
+    } else if (current == State::Connecting && !finished) {
         if (dropped)
             dropped(this);
-        return true;
+    } else if (current == State::Idle) {
+        if (dropped)
+            dropped(this);
+    } else if (current != State::Closed) {
+        finish(socketFailure());
     }
-    return false;
 }
 
 void WendrelConnection::endOfInput() {
-    if (handledElsewhere(QNetworkReply::RemoteHostClosedError))
+    if (current == State::Closed)
         return;
-    const QByteArray rest = socket->readAll();
-    if (!rest.isEmpty()) {
-        feed(rest.constData(), rest.size());
-        if (!finished)
-            return;
+    if (!finished) {
+        if (dropped)
+            dropped(this);
+        return;
     }
-    // The end of the input ends an answer that runs until the connection closes.
-    http_parser_execute(&parser, &settings, nullptr, 0);
-    keepAlive = false;
-    finish(complete ? QNetworkReply::NoError : QNetworkReply::RemoteHostClosedError);
+    if (current == State::Connecting) {
+        finish({QNetworkReply::RemoteHostClosedError,
+                qobject_cast<QSslSocket*>(socket)
+                    ? "connection closed by the server during the TLS handshake"
+                    : "connection closed by the server while connecting"});
+        return;
+    }
+    // What a buffered (TLS) socket still holds belongs to the answer.
+    if (pull() == Pull::Done)
+        return;
+    reader.endOfInput();
+    answerRead(0, 0);
 }
 
-void WendrelConnection::feed(const char* data, qsizetype size) {
-    if (size == 0)
-        return;
-    answer.answerBegan = true;
-    answer.reachedServer = true;
-    const size_t parsed = http_parser_execute(&parser, &settings, data, size_t(size));
-    if (tooLarge) {
-        answer.body.clear();
-        keepAlive = false;
-        finish(QNetworkReply::UnknownContentError);
-    } else if (complete) {
-        // Bytes beyond the answer would put every later exchange out of step.
-        if (parsed < size_t(size))
-            keepAlive = false;
-        finish(QNetworkReply::NoError);
-    } else if (HTTP_PARSER_ERRNO(&parser) != HPE_OK) {
-        keepAlive = false;
-        finish(QNetworkReply::ProtocolFailure);
+void WendrelConnection::answerRead(qsizetype used, qsizetype size) {
+    if (reader.state() == WendrelResponseReader::State::Complete) {
+        surplus = used < size;
+        finish({});
+    } else {
+        finish(readerFailure());
     }
 }
 
-void WendrelConnection::finish(QNetworkReply::NetworkError error) {
-    if (error != QNetworkReply::NoError || socket->state() != QAbstractSocket::ConnectedState)
-        keepAlive = false;
-    answer.error = error;
+void WendrelConnection::recordTlsErrors(const QList<QSslError>& errors) {
+    tlsErrors.clear();
+    for (const QSslError& error : errors) {
+        if (!tlsErrors.isEmpty())
+            tlsErrors.append("; ");
+        tlsErrors.append(WendrelFailure::peerText(error.errorString().toUtf8()));
+    }
+    const QSslCertificate peer = static_cast<QSslSocket*>(socket)->peerCertificate();
+    if (!peer.isNull())
+        tlsErrors.append(" (peer certificate: " + describe(peer) + ')');
+}
+
+WendrelFailure WendrelConnection::socketFailure() const {
+    const QAbstractSocket::SocketError error = socket->error();
+    const QNetworkReply::NetworkError mapped = networkError(error);
+    switch (error) {
+    case QAbstractSocket::ConnectionRefusedError:
+        return {mapped, "connection refused"};
+    case QAbstractSocket::HostNotFoundError:
+        return {mapped, "host not found"};
+    case QAbstractSocket::SslHandshakeFailedError:
+        return {mapped,
+                "TLS handshake failed: " +
+                    (tlsErrors.isEmpty() ? WendrelFailure::peerText(socket->errorString().toUtf8())
+                                         : tlsErrors)};
+    default:
+        return {mapped,
+                "network error: " + WendrelFailure::peerText(socket->errorString().toUtf8())};
+    }
+}
+
+WendrelFailure WendrelConnection::readerFailure() const {
+    using Failure = WendrelResponseReader::Failure;
+    switch (reader.failure()) {
+    case Failure::HeadersTooLarge:
+        return {QNetworkReply::UnknownContentError, "answer over the cap: header lines over " +
+                                                        QByteArray::number(reader.maxHeaderSize()) +
+                                                        " bytes"};
+    case Failure::BodyTooLarge:
+        return {QNetworkReply::UnknownContentError, "answer over the cap: body over " +
+                                                        QByteArray::number(reader.maxBodySize()) +
+                                                        " bytes"};
+    case Failure::Malformed:
+        return {QNetworkReply::ProtocolFailure,
+                QByteArray("malformed answer (") + reader.parserError() + ')'};
+    case Failure::EndedEarly:
+    case Failure::None:
+        break;
+    }
+    return {QNetworkReply::RemoteHostClosedError,
+            reader.began() ? "connection closed by the server in the middle of the answer"
+                           : "connection closed by the server before any answer"};
+}
+
+void WendrelConnection::finish(WendrelFailure failure) {
+    if (!finished)
+        return;
+    Outcome outcome;
+    outcome.answerBegan = reader.began();
+    outcome.reachedServer = reachedServer();
+    outcome.connectionReused = exchanges > 0;
+    const bool reusable = !failure.failed() && current == State::Reading && !surplus &&
+                          reader.answer().keepAlive && socket->bytesAvailable() == 0 &&
+                          socket->state() == QAbstractSocket::ConnectedState;
+    outcome.answer = reader.takeAnswer();
+    outcome.failure = std::move(failure);
     ++exchanges;
     const Finished done = std::move(finished);
     finished = nullptr;
-    // The callback may send on this connection again, or close it.
-    done(this, std::move(answer));
-}
-
-void WendrelConnection::beginValue() {
-    fieldEnd = answer.headers.size();
-    answer.headers.append(": ");
-    valueStart = answer.headers.size();
-}
-
-// Header lines go straight into the answer's text; only the two values used are copied.
-void WendrelConnection::endHeaderLine() {
-    if (!readingField && !readingValue)
-        return;
-    if (!readingValue)
-        beginValue();
-    QByteArray& text = answer.headers;
-    const QByteArrayView field(text.constData() + fieldStart, fieldEnd - fieldStart);
-    const QByteArrayView value(text.constData() + valueStart, text.size() - valueStart);
-    const auto named = [&field](QByteArrayView name) {
-        return field.size() == name.size() &&
-               qstrnicmp(field.data(), name.data(), size_t(name.size())) == 0;
-    };
-    if (named("WWW-Authenticate")) {
-        if (!answer.challenges.isEmpty())
-            answer.challenges.append(", ");
-        answer.challenges.append(value);
-    } else if (named("Location")) {
-        answer.location = value.toByteArray();
-    }
-    text.append("\r\n");
-    readingField = readingValue = false;
-}
-
-int WendrelConnection::onMessageBegin(http_parser* parser) {
-    // The final answer after an interim one starts afresh.
-    WendrelConnection* self = ownerOf(parser);
-    self->answer.headers.clear();
-    self->answer.challenges.clear();
-    self->answer.location.clear();
-    self->answer.body.clear();
-    return 0;
-}
-
-int WendrelConnection::onHeaderField(http_parser* parser, const char* at, size_t length) {
-    WendrelConnection* self = ownerOf(parser);
-    if (self->readingValue)
-        self->endHeaderLine();
-    if (!self->readingField) {
-        self->readingField = true;
-        self->fieldStart = self->answer.headers.size();
-    }
-    self->answer.headers.append(at, qsizetype(length));
-    return 0;
-}
-
-int WendrelConnection::onHeaderValue(http_parser* parser, const char* at, size_t length) {
-    WendrelConnection* self = ownerOf(parser);
-    if (!self->readingValue) {
-        self->readingValue = true;
-        self->beginValue();
-    }
-    self->answer.headers.append(at, qsizetype(length));
-    return 0;
-}
-
-int WendrelConnection::onHeadersComplete(http_parser* parser) {
-    WendrelConnection* self = ownerOf(parser);
-    self->endHeaderLine();
-    self->answer.status = int(parser->status_code);
-    self->interim = parser->status_code >= 100 && parser->status_code < 200;
-    // A declared length over the cap ends the exchange before the body comes.
-    if (!self->interim && parser->content_length != ULLONG_MAX &&
-        parser->content_length > quint64(self->maxBodySize)) {
-        self->tooLarge = true;
-        return -1;
-    }
-    return 0;
-}
-
-int WendrelConnection::onBody(http_parser* parser, const char* at, size_t length) {
-    WendrelConnection* self = ownerOf(parser);
-    if (self->answer.body.size() + qint64(length) > self->maxBodySize) {
-        self->tooLarge = true;
-        return -1;
-    }
-    self->answer.body.append(at, qsizetype(length));
-    return 0;
-}
-
-int WendrelConnection::onMessageComplete(http_parser* parser) {
-    WendrelConnection* self = ownerOf(parser);
-    if (self->interim)
-        return 0;
-    self->complete = true;
-    self->keepAlive = http_should_keep_alive(parser) != 0;
-    http_parser_pause(parser, 1);
-    return 0;
+    if (reusable)
+        setState(State::Idle);
+    else
+        close();
+    // The callback may send on this connection again.
+    done(this, std::move(outcome));
 }

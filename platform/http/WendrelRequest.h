@@ -21,7 +21,8 @@ struct WendrelRequest {
     QStringList headers; // "Name: value"
     QString user;
     QString password;
-    bool bearer = false; // the password goes out as a bearer token, user is unused
+    bool bearer = false;         // the password goes out as a bearer token, user is unused
+    Clock::time_point submitted; // when the caller made the request
     std::optional<Clock::time_point> deadline;
     HttpReplyCallback callback;
 };

@@ -101,12 +101,24 @@ QString WendrelUrl::origin(const QUrl& url) {
         .append(QString::number(port(url)));
 }
 
+namespace {
+
+QByteArray hostText(const QUrl& url) {
+    const QByteArray host = url.host(QUrl::FullyEncoded).toLatin1();
+    return host.contains(':') ? '[' + host + ']' : host;
+}
+
+} // namespace
+
 QByteArray WendrelUrl::hostHeader(const QUrl& url) {
-    QByteArray host = url.host(QUrl::FullyEncoded).toLatin1();
-    if (host.contains(':'))
-        host = '[' + host + ']';
+    QByteArray host = hostText(url);
     const quint16 portNumber = port(url);
     if (portNumber != (isHttps(url) ? 443 : 80))
         host += ':' + QByteArray::number(portNumber);
     return host;
+}
+
+QByteArray WendrelUrl::forLog(const QUrl& url) {
+    return url.scheme().toLatin1() + "://" + hostText(url) + ':' + QByteArray::number(port(url)) +
+           url.path(QUrl::FullyEncoded).toLatin1();
 }

@@ -21,4 +21,7 @@ public:
     static QString origin(const QUrl& url);
     // The Host header's value: the port only when it is not the scheme's default.
     static QByteArray hostHeader(const QUrl& url);
+    // Scheme, host, port and path for a log line: not the query, which may carry what is not
+    // for a log.
+    static QByteArray forLog(const QUrl& url);
 };

@@ -1,7 +1,6 @@
 #include "WendrelWorker.h"
 
 #include "Wendrel.h"
-#include "WendrelAuth.h"
 #include "WendrelLog.h"
 #include "WendrelUrl.h"
 
@@ -11,60 +10,12 @@
 #include <algorithm>
 #include <climits>
 #include <utility>
-#include <vector>
 
 namespace {
 
-// Headers the request line and body settle.
-bool framingHeader(const QByteArray& name) {
-    for (const char* framing : {"Host", "Content-Length", "Transfer-Encoding", "Connection"}) {
-        if (name.compare(framing, Qt::CaseInsensitive) == 0)
-            return true;
-    }
-    return false;
-}
-
-// As Qt maps HTTP statuses of 400 and above.
-QNetworkReply::NetworkError statusError(int status) {
-    switch (status) {
-    case 400:
-    case 418:
-        return QNetworkReply::ProtocolInvalidOperationError;
-    case 401:
-        return QNetworkReply::AuthenticationRequiredError;
-    case 403:
-        return QNetworkReply::ContentAccessDenied;
-    case 404:
-        return QNetworkReply::ContentNotFoundError;
-    case 405:
-        return QNetworkReply::ContentOperationNotPermittedError;
-    case 407:
-        return QNetworkReply::ProxyAuthenticationRequiredError;
-    case 409:
-        return QNetworkReply::ContentConflictError;
-    case 410:
-        return QNetworkReply::ContentGoneError;
-    case 500:
-        return QNetworkReply::InternalServerError;
-    case 501:
-        return QNetworkReply::OperationNotImplementedError;
-    case 503:
-        return QNetworkReply::ServiceUnavailableError;
-    default:
-        if (status > 500)
-            return QNetworkReply::UnknownServerError;
-        return status >= 400 ? QNetworkReply::UnknownContentError : QNetworkReply::NoError;
-    }
-}
-
-bool isRedirect(int status) {
-    return status == 301 || status == 302 || status == 303 || status == 305 || status == 307 ||
-           status == 308;
-}
-
-// Bearer requests carry their token and answer no challenge.
-bool hasCredentials(const WendrelRequest& request) {
-    return !request.bearer && !(request.user.isEmpty() && request.password.isEmpty());
+qint64 millisecondsSince(std::chrono::steady_clock::time_point then,
+                         std::chrono::steady_clock::time_point now) {
+    return std::chrono::duration_cast<std::chrono::milliseconds>(now - then).count();
 }
 
 } // namespace
@@ -82,36 +33,34 @@ WendrelWorker::WendrelWorker(const WendrelTlsSettings& tls)
 }
 
 void WendrelWorker::start(WendrelRequest request) {
-    if (closing) {
-        answer(request.callback, QNetworkReply::OperationCanceledError, {}, {}, false);
-        return;
-    }
-    if (request.url.host().isEmpty()) {
-        answer(request.callback, QNetworkReply::HostNotFoundError, {}, {}, false);
-        return;
-    }
-    if (!WendrelUrl::isHttp(request.url)) {
-        answer(request.callback, QNetworkReply::ProtocolUnknownError, {}, {}, false);
-        return;
-    }
-    if (request.deadline && *request.deadline <= Clock::now()) {
-        answer(request.callback, QNetworkReply::TimeoutError, {}, {}, false);
+    WendrelFailure refusal;
+    if (closing)
+        refusal = {QNetworkReply::OperationCanceledError, "cancelled: the client is shutting down"};
+    else if (request.url.host().isEmpty())
+        refusal = {QNetworkReply::HostNotFoundError, "no host given"};
+    else if (!WendrelUrl::isHttp(request.url))
+        refusal = {QNetworkReply::ProtocolUnknownError, "only http and https are served"};
+    else if (request.deadline && *request.deadline <= Clock::now())
+        refusal = {QNetworkReply::TimeoutError, "timed out before it could start"};
+    if (refusal.failed()) {
+        answer(request, refusal, {}, {}, false);
         return;
     }
 
     const Id id = nextId++;
-    Pending& entry = pending[id];
-    entry.origin = WendrelUrl::origin(request.url);
-    entry.slot = &origins[entry.origin];
-    entry.deadline = request.deadline ? deadlines.emplace(*request.deadline, id) : deadlines.end();
-    entry.request = std::move(request);
-    if (entry.deadline != deadlines.end() && entry.deadline == deadlines.begin())
+    QString origin = WendrelUrl::origin(request.url);
+    Origin* slot = &origins[origin];
+    const auto deadline =
+        request.deadline ? deadlines.emplace(*request.deadline, id) : deadlines.end();
+    pending.emplace(id, Pending{WendrelExchange(std::move(request), std::move(origin)), slot,
+                                nullptr, std::nullopt, deadline});
+    if (deadline != deadlines.end() && deadline == deadlines.begin())
         armDeadlineTimer();
 
-    if (hasRoom(*entry.slot))
-        launch(id, {});
+    if (hasRoom(*slot))
+        launch(id, false);
     else
-        entry.slot->waiting.push_back(id);
+        slot->waiting.push_back(id);
 }
 
 void WendrelWorker::shutdown() {
@@ -154,57 +103,19 @@ const std::optional<QSslConfiguration>& WendrelWorker::tlsConfiguration() {
     return sslConfiguration;
 }
 
-// The whole request. Nothing carries over from one request to the next: no credentials but the
-// request's own (WendrelAuth answers challenges), and no cookies.
-QByteArray WendrelWorker::message(const Pending& entry, const QByteArray& authorization) {
-    const WendrelRequest& request = entry.request;
-    const QByteArray target = WendrelAuth::target(request.url);
-    QByteArray result;
-    result.reserve(256 + request.body.size());
-    result.append(request.method).append(' ').append(target).append(" HTTP/1.1\r\nHost: ");
-    result.append(WendrelUrl::hostHeader(request.url)).append("\r\n");
-    for (const QString& header : request.headers) {
-        const qsizetype colon = header.indexOf(QLatin1Char(':'));
-        const QByteArray name = header.left(colon).trimmed().toLatin1();
-        if (colon > 0 && !framingHeader(name))
-            result.append(name)
-                .append(": ")
-                .append(header.mid(colon + 1).trimmed().toLatin1())
-                .append("\r\n");
-    }
-    if (!request.contentType.isEmpty())
-        result.append("Content-Type: ").append(request.contentType.toLatin1()).append("\r\n");
-    if (request.bearer) {
-        result.append("Authorization: Bearer ").append(request.password.toUtf8()).append("\r\n");
-    } else {
-        const QByteArray sent = authorization.isEmpty() && hasCredentials(request)
-                                    ? authentication.before(entry.origin, request.method, target,
-                                                            request.user, request.password)
-                                    : authorization;
-        if (!sent.isEmpty())
-            result.append("Authorization: ").append(sent).append("\r\n");
-    }
-    if (!request.body.isEmpty() || (request.method != "GET" && request.method != "HEAD"))
-        result.append("Content-Length: ")
-            .append(QByteArray::number(request.body.size()))
-            .append("\r\n");
-    result.append("\r\n").append(request.body);
-    return result;
-}
-
 bool WendrelWorker::hasRoom(const Origin& origin) {
     return !origin.idle.empty() || origin.open < connectionsPerOrigin;
 }
 
-void WendrelWorker::launch(Id id, const QByteArray& authorization) {
+void WendrelWorker::launch(Id id, bool newConnection) {
     Pending& entry = pending.at(id);
     Origin& origin = *entry.slot;
     WendrelConnection* connection = nullptr;
-    if (!origin.idle.empty()) {
+    if (!newConnection && !origin.idle.empty()) {
         connection = origin.idle.back();
         origin.idle.pop_back();
     } else {
-        const QUrl& url = entry.request.url;
+        const QUrl& url = entry.exchange.request().url;
         const bool https = WendrelUrl::isHttps(url);
         connection = new WendrelConnection(
             url.host(), WendrelUrl::port(url), https, https ? tlsConfiguration() : std::nullopt,
@@ -212,10 +123,12 @@ void WendrelWorker::launch(Id id, const QByteArray& authorization) {
             [this, slot = entry.slot](WendrelConnection* gone) { dropped(*slot, gone); }, this);
         ++origin.open;
     }
+    if (!entry.firstConnection)
+        entry.firstConnection = Clock::now();
     entry.connection = connection;
-    connection->send(message(entry, authorization),
-                     [this, id](WendrelConnection* ended, WendrelConnection::Answer answer) {
-                         exchangeEnded(id, ended, std::move(answer));
+    connection->send(entry.exchange.message(authentication),
+                     [this, id](WendrelConnection* ended, WendrelConnection::Outcome outcome) {
+                         exchangeEnded(id, ended, std::move(outcome));
                      });
 }
 
@@ -232,44 +145,34 @@ void WendrelWorker::launchWaiting(Origin& origin) {
         const Deadlines::iterator deadline = entry->second.deadline;
         if (deadline != deadlines.end() && deadline->first <= now)
             continue;
-        launch(id, {});
+        launch(id, false);
     }
 }
 
 void WendrelWorker::exchangeEnded(Id id, WendrelConnection* connection,
-                                  WendrelConnection::Answer answer) {
+                                  WendrelConnection::Outcome outcome) {
     Pending& entry = pending.at(id);
     entry.connection = nullptr;
     Origin& origin = *entry.slot;
-    release(origin, connection);
-
-    // A kept-alive connection that the server had closed in the meantime: once more on a new
-    // one, as browsers and Qt do.
-    if (answer.error != QNetworkReply::NoError && !answer.answerBegan && answer.connectionReused &&
-        !entry.resent && !closing) {
-        entry.resent = true;
-        launch(id, {});
-        return;
-    }
-    if (answer.error == QNetworkReply::NoError && !closing) {
-        if (answer.status == 401 && answerChallenge(id, answer.challenges))
-            return;
-        if (isRedirect(answer.status) && !answer.location.isEmpty() && followRedirect(id, answer))
-            return;
-    }
-    const QNetworkReply::NetworkError error =
-        answer.error != QNetworkReply::NoError ? answer.error : statusError(answer.status);
-    complete(id, error, answer.headers, answer.body, answer.reachedServer);
-    launchWaiting(origin);
-}
-
-void WendrelWorker::release(Origin& origin, WendrelConnection* connection) {
-    if (connection->reusable() && !closing) {
+    // One that cannot carry another exchange has closed itself.
+    if (connection->state() == WendrelConnection::State::Idle)
         origin.idle.push_back(connection);
-    } else {
-        connection->close();
+    else
         --origin.open;
+
+    const WendrelExchange::Next next = entry.exchange.next(outcome, authentication);
+    switch (next.action) {
+    case WendrelExchange::Action::Send:
+        launch(id, false);
+        return;
+    case WendrelExchange::Action::SendOnNewConnection:
+        launch(id, true);
+        return;
+    case WendrelExchange::Action::Complete:
+        break;
     }
+    complete(id, next.failure, outcome.answer.headers, outcome.answer.body, outcome.reachedServer);
+    launchWaiting(origin);
 }
 
 void WendrelWorker::dropped(Origin& origin, WendrelConnection* connection) {
@@ -280,85 +183,56 @@ void WendrelWorker::dropped(Origin& origin, WendrelConnection* connection) {
     launchWaiting(origin);
 }
 
-// Sends the request again with an answer to the challenge: once, so that rejected credentials
-// end the request with AuthenticationRequiredError.
-bool WendrelWorker::answerChallenge(Id id, const QByteArray& challenges) {
-    Pending& entry = pending.at(id);
-    const WendrelRequest& request = entry.request;
-    if (!hasCredentials(request))
-        return false;
-    if (entry.challengeAnswered) {
-        authentication.forget(entry.origin, request.user, request.password);
-        return false;
-    }
-    const QByteArray authorization =
-        authentication.answer(entry.origin, challenges, request.method,
-                              WendrelAuth::target(request.url), request.user, request.password);
-    if (authorization.isEmpty())
-        return false;
-    entry.challengeAnswered = true;
-    launch(id, authorization);
-    return true;
-}
-
-// Follows a redirect to the same scheme, host and port, with the same credentials; ends the
-// request when it leads elsewhere or too far.
-bool WendrelWorker::followRedirect(Id id, const WendrelConnection::Answer& answer) {
-    Pending& entry = pending.at(id);
-    const QUrl target = entry.request.url.resolved(QUrl::fromEncoded(answer.location));
-    QNetworkReply::NetworkError refusal = QNetworkReply::NoError;
-    if (!target.isValid() || !WendrelUrl::isHttp(target))
-        refusal = QNetworkReply::ProtocolFailure;
-    else if (WendrelUrl::origin(target) != entry.origin)
-        refusal = QNetworkReply::InsecureRedirectError;
-    else if (++entry.redirects > maxRedirects)
-        refusal = QNetworkReply::TooManyRedirectsError;
-    if (refusal != QNetworkReply::NoError) {
-        Origin& origin = *entry.slot;
-        complete(id, refusal, answer.headers, answer.body, answer.reachedServer);
-        launchWaiting(origin);
-        return true;
-    }
-    WendrelRequest& request = entry.request;
-    if (answer.status == 303 ||
-        ((answer.status == 301 || answer.status == 302) && request.method == "POST")) {
-        request.method = "GET";
-        request.body.clear();
-        request.contentType.clear();
-    }
-    request.url = target;
-    entry.challengeAnswered = false;
-    launch(id, {});
-    return true;
-}
-
 void WendrelWorker::abortRequest(Id id, QNetworkReply::NetworkError reason) {
     const auto found = pending.find(id);
     if (found == pending.end())
         return;
     Pending& entry = found->second;
+    const WendrelFailure failure = abortFailure(entry, reason);
     WendrelConnection* connection = std::exchange(entry.connection, nullptr);
     if (!connection) {
         // Still waiting for its turn: its place in the queue is skipped later.
-        complete(id, reason, {}, {}, false);
+        complete(id, failure, {}, {}, false);
         return;
     }
     Origin& origin = *entry.slot;
     const bool reachedServer = connection->reachedServer();
     connection->close();
     --origin.open;
-    complete(id, reason, {}, {}, reachedServer);
+    complete(id, failure, {}, {}, reachedServer);
     launchWaiting(origin);
 }
 
-void WendrelWorker::complete(Id id, QNetworkReply::NetworkError error, const QByteArray& headers,
+WendrelFailure WendrelWorker::abortFailure(const Pending& entry,
+                                           QNetworkReply::NetworkError reason) const {
+    if (reason != QNetworkReply::TimeoutError)
+        return {reason, "cancelled: the client is shutting down"};
+    const WendrelRequest& request = entry.exchange.request();
+    const Clock::time_point now = Clock::now();
+    QByteArray text =
+        "timed out after " + QByteArray::number(millisecondsSince(request.submitted, now)) + " ms ";
+    if (!entry.firstConnection)
+        return {reason, text + "waiting for a free connection (" +
+                            QByteArray::number(connectionsPerOrigin) +
+                            " to this server, all busy)"};
+    if (entry.connection)
+        text += entry.connection->activity();
+    else
+        text += "between attempts";
+    return {reason,
+            text + " (it waited " +
+                QByteArray::number(millisecondsSince(request.submitted, *entry.firstConnection)) +
+                " ms for a connection)"};
+}
+
+void WendrelWorker::complete(Id id, const WendrelFailure& failure, const QByteArray& headers,
                              const QByteArray& body, bool reachedServer) {
     const auto found = pending.find(id);
     Pending entry = std::move(found->second);
     pending.erase(found);
     if (entry.deadline != deadlines.end())
         deadlines.erase(entry.deadline);
-    answer(entry.request.callback, error, headers, body, reachedServer);
+    answer(entry.exchange.request(), failure, headers, body, reachedServer);
 }
 
 void WendrelWorker::expireDeadlines() {
@@ -381,13 +255,21 @@ void WendrelWorker::armDeadlineTimer() {
     deadlineTimer.start(static_cast<int>(std::clamp<qint64>(wait.count(), 0, INT_MAX)));
 }
 
-void WendrelWorker::answer(const HttpReplyCallback& callback, QNetworkReply::NetworkError error,
+void WendrelWorker::answer(const WendrelRequest& request, const WendrelFailure& failure,
                            const QByteArray& headers, const QByteArray& body, bool reachedServer) {
-    if (!callback)
+    if (failure.failed()) {
+        wendrelLog().print(
+            KalbLogClient::Failure, __FILE__, __LINE__, "%s %s failed after %lld ms: %s",
+            WendrelFailure::peerText(request.method).constData(),
+            WendrelFailure::peerText(WendrelUrl::forLog(request.url)).constData(),
+            static_cast<long long>(millisecondsSince(request.submitted, Clock::now())),
+            failure.reason.constData());
+    }
+    if (!request.callback)
         return;
     // Nothing may unwind into the event loop.
     try {
-        callback(error, headers, body, reachedServer);
+        request.callback(failure.error, headers, body, reachedServer);
     } catch (...) {
         wendrelLog().print(KalbLogClient::Failure, __FILE__, __LINE__,
                            "a reply callback threw; the exception was dropped");

@@ -2,9 +2,10 @@
 
 #include "WendrelAuth.h"
 #include "WendrelConnection.h"
+#include "WendrelExchange.h"
+#include "WendrelFailure.h"
 #include "WendrelRequest.h"
 
-#include <QNetworkReply>
 #include <QObject>
 #include <QSslConfiguration>
 #include <QString>
@@ -18,9 +19,10 @@
 
 struct WendrelTlsSettings;
 
-// Lives on Wendrel's worker thread and runs every request there, over its own keep-alive
-// connections (at most connectionsPerOrigin per scheme, host and port) and one deadline timer for
-// all of them. Requests beyond the connections wait here, in order, under the same deadlines.
+// Lives on Wendrel's worker thread and runs every request there: it keeps the connections (at
+// most connectionsPerOrigin per scheme, host and port, kept alive between requests), the
+// requests waiting for one, in order, and one deadline timer for all of them; WendrelExchange
+// decides what each answer leads to. Every failure is logged once, with its reason.
 // Every member function except the constructor runs on that thread; nothing here is locked.
 class WendrelWorker : public QObject {
 public:
@@ -34,25 +36,11 @@ public:
     static constexpr qint64 maxBodySize = 8 * 1024 * 1024;
     // Enough to keep a camera busy under load, few enough for a small server.
     static constexpr int connectionsPerOrigin = 16;
-    // Qt's limit.
-    static constexpr int maxRedirects = 50;
 
 private:
     using Clock = WendrelRequest::Clock;
     using Id = quint64;
     using Deadlines = std::multimap<Clock::time_point, Id>;
-
-    struct Origin;
-    struct Pending {
-        WendrelRequest request; // kept for the answer to a challenge, a redirect or a resend
-        QString origin;
-        Origin* slot = nullptr;
-        WendrelConnection* connection = nullptr; // none while waiting for its turn
-        bool challengeAnswered = false;
-        bool resent = false;
-        int redirects = 0;
-        Deadlines::iterator deadline;
-    };
 
     struct Origin {
         int open = 0; // connections, carrying an exchange or idle
@@ -60,22 +48,28 @@ private:
         std::deque<Id> waiting; // may hold ids already answered; they are skipped
     };
 
+    struct Pending {
+        WendrelExchange exchange;
+        Origin* slot = nullptr;
+        WendrelConnection* connection = nullptr;          // none while waiting for its turn
+        std::optional<Clock::time_point> firstConnection; // when it first got one
+        Deadlines::iterator deadline;
+    };
+
     const std::optional<QSslConfiguration>& tlsConfiguration();
-    QByteArray message(const Pending& entry, const QByteArray& authorization);
     static bool hasRoom(const Origin& origin);
-    void launch(Id id, const QByteArray& authorization);
+    void launch(Id id, bool newConnection);
     void launchWaiting(Origin& origin);
-    void exchangeEnded(Id id, WendrelConnection* connection, WendrelConnection::Answer answer);
-    void release(Origin& origin, WendrelConnection* connection);
+    void exchangeEnded(Id id, WendrelConnection* connection, WendrelConnection::Outcome outcome);
     void dropped(Origin& origin, WendrelConnection* connection);
-    bool answerChallenge(Id id, const QByteArray& challenges);
-    bool followRedirect(Id id, const WendrelConnection::Answer& answer);
     void abortRequest(Id id, QNetworkReply::NetworkError reason);
-    void complete(Id id, QNetworkReply::NetworkError error, const QByteArray& headers,
+    WendrelFailure abortFailure(const Pending& entry, QNetworkReply::NetworkError reason) const;
+    void complete(Id id, const WendrelFailure& failure, const QByteArray& headers,
                   const QByteArray& body, bool reachedServer);
     void expireDeadlines();
     void armDeadlineTimer();
-    static void answer(const HttpReplyCallback& callback, QNetworkReply::NetworkError error,
+    // Logs a failure and calls back; nothing the callback throws gets out.
+    static void answer(const WendrelRequest& request, const WendrelFailure& failure,
                        const QByteArray& headers, const QByteArray& body, bool reachedServer);
 
     bool closing = false;

@@ -11,6 +11,7 @@
 
 #include <QJsonDocument>
 #include <QProcess>
+#include <QRegularExpression>
 #include <QTcpServer>
 #include <QTcpSocket>
 #include <QTemporaryDir>
@@ -36,6 +37,7 @@ enum class Camera { Simulated, Refusing, Garbled, Tls };
 struct FaultCase {
     const char* name;
     Camera camera;
+    const char* reason; // what the log says at its default level, a regular expression
     const char* camsimArguments = "";
     bool waitsForDeadline = false;
 };
@@ -138,6 +140,10 @@ TEST_P(CameraFaultTest, EveryCommandIsAnsweredOnceWithTheFailureResult) {
         }
     }
     EXPECT_EQ(host.stop(), 0) << qPrintable(host.errorOutput());
+    const QRegularExpression reason(
+        QStringLiteral(R"(\[Wendrel\] L2 \S+ \w+ https?://127\.0\.0\.1:)") + QString::number(port) +
+        QStringLiteral(R"(/\S* failed after \d+ ms: )") + QString::fromLatin1(c.reason));
+    EXPECT_TRUE(reason.match(host.errorOutput()).hasMatch()) << qPrintable(host.errorOutput());
     everything += host.errorOutput();
     for (const std::string& line : camsim ? camsim->logLines() : std::vector<std::string>())
         everything += QString::fromStdString(line);
@@ -151,15 +157,23 @@ TEST_P(CameraFaultTest, EveryCommandIsAnsweredOnceWithTheFailureResult) {
 INSTANTIATE_TEST_SUITE_P(
     Faults, CameraFaultTest,
     ::testing::Values(
-        FaultCase{"ConnectionRefused", Camera::Refusing},
-        FaultCase{"ResetMidAnswer", Camera::Simulated, "--fault close"},
+        FaultCase{"ConnectionRefused", Camera::Refusing, "connection refused"},
+        FaultCase{"ResetMidAnswer", Camera::Simulated,
+                  "connection closed by the server (before any|in the middle of the) answer",
+                  "--fault close"},
         FaultCase{"NoAnswerUntilTheDeadline", Camera::Simulated,
+                  "timed out after 10\\d{3} ms waiting for the answer",
                   "--fault delay --fault-delay-ms 30000", true},
-        FaultCase{"WrongCredentials", Camera::Simulated, "--pass the-right-one"},
-        FaultCase{"WrongBasicCredentials", Camera::Simulated, "--auth basic --pass x"},
-        FaultCase{"NotFound", Camera::Simulated, "--fault status --fault-status 404"},
-        FaultCase{"ServerError", Camera::Simulated, "--fault status --fault-status 500"},
-        FaultCase{"MalformedAnswer", Camera::Garbled},
-        FaultCase{"OversizedAnswer", Camera::Simulated, "--fault oversize"},
-        FaultCase{"UntrustedCertificate", Camera::Tls}),
+        FaultCase{"WrongCredentials", Camera::Simulated, "credentials rejected \\(Digest\\)",
+                  "--pass the-right-one"},
+        FaultCase{"WrongBasicCredentials", Camera::Simulated, "credentials rejected \\(Basic\\)",
+                  "--auth basic --pass x"},
+        FaultCase{"NotFound", Camera::Simulated, "HTTP 404 ", "--fault status --fault-status 404"},
+        FaultCase{"ServerError", Camera::Simulated, "HTTP 500 ",
+                  "--fault status --fault-status 500"},
+        FaultCase{"MalformedAnswer", Camera::Garbled, "malformed answer \\(HPE_\\w+\\)"},
+        FaultCase{"OversizedAnswer", Camera::Simulated, "answer over the cap: body over",
+                  "--fault oversize"},
+        FaultCase{"UntrustedCertificate", Camera::Tls,
+                  "TLS handshake failed: .*self-signed.*SHA-256 [0-9a-f:]{95}"}),
     [](const ::testing::TestParamInfo<FaultCase>& info) { return info.param.name; });
