@@ -1,5 +1,5 @@
 # Cross-compiles for Windows x86-64 with MinGW-w64 (Debian: g++-mingw-w64-x86-64-posix).
-#   cmake -S tests/windows -B build-windows -DCMAKE_TOOLCHAIN_FILE=tests/windows/mingw-w64-x86_64.cmake
+# Used by tests/windows/CMakeLists.txt (see there).
 set(CMAKE_SYSTEM_NAME Windows)
 set(CMAKE_SYSTEM_PROCESSOR x86_64)
 # The POSIX-threads variant: GCC 12's Win32-threads one has no std::mutex.
