@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
 # Set-up, build and run. Usage: ./run.sh demo | ./run.sh test [--asan|--tsan [CTEST_ARGS...]] |
-# ./run.sh bench | ./run.sh fuzz [SECONDS]
+# ./run.sh test --windows | ./run.sh bench | ./run.sh fuzz [SECONDS]
 set -euo pipefail
 cd "$(dirname "$0")"
 
@@ -12,6 +12,8 @@ DEMO_PACKAGES=(curl jq)
 BENCH_PACKAGES=(libbenchmark-dev nginx-light wrk python3)
 # AddressSanitizer builds and fuzzing: clang, its sanitizer runtimes, llvm-symbolizer for traces.
 CLANG_PACKAGES=(clang libclang-rt-14-dev llvm)
+# The logging library's Windows code: the MinGW-w64 cross compiler and Wine to run what it built.
+WINDOWS_PACKAGES=(cmake ninja-build ccache g++-mingw-w64-x86-64-posix wine64)
 
 as_root() {
     if [ "$(id -u)" -eq 0 ]; then "$@"; else sudo "$@"; fi
@@ -70,8 +72,12 @@ test)
         (cd build-tsan && TSAN_OPTIONS="suppressions=$suppressions" \
             ctest --output-on-failure --timeout 300 -j"$(nproc)" "${@:3}")
         ;;
+    --windows)
+        ensure_packages "${WINDOWS_PACKAGES[@]}"
+        tests/windows/windows.sh build-windows
+        ;;
     *)
-        echo "usage: $0 test [--asan|--tsan [CTEST_ARGS...]]" >&2
+        echo "usage: $0 test [--asan|--tsan [CTEST_ARGS...]|--windows]" >&2
         exit 2
         ;;
     esac

@@ -13,31 +13,34 @@
 namespace {
 
 #if defined(_WIN32)
-const char LIBRARY_NAME[] = "KalbLogUtl.dll";
+const wchar_t LIBRARY_NAME[] = L"KalbLogUtl.dll";
 
-std::string moduleFolder() {
+// Wide calls: a folder name outside the ANSI code page does not survive the ANSI ones.
+std::wstring moduleFolder() {
     HMODULE self = nullptr;
-    if (!GetModuleHandleExA(GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS |
+    if (!GetModuleHandleExW(GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS |
                                 GET_MODULE_HANDLE_EX_FLAG_UNCHANGED_REFCOUNT,
-                            reinterpret_cast<LPCSTR>(&moduleFolder), &self))
+                            reinterpret_cast<LPCWSTR>(&moduleFolder), &self))
         return {};
-    char path[MAX_PATH];
-    const DWORD length = GetModuleFileNameA(self, path, MAX_PATH);
+    wchar_t path[MAX_PATH];
+    const DWORD length = GetModuleFileNameW(self, path, MAX_PATH);
     if (length == 0 || length == MAX_PATH)
         return {};
-    std::string folder(path, length);
-    const auto slash = folder.find_last_of("\\/");
-    return slash == std::string::npos ? std::string() : folder.substr(0, slash + 1);
+    std::wstring folder(path, length);
+    const auto slash = folder.find_last_of(L"\\/");
+    return slash == std::wstring::npos ? std::wstring() : folder.substr(0, slash + 1);
 }
 
 void* openLibrary() {
-    const std::string folder = moduleFolder();
+    const std::wstring folder = moduleFolder();
     if (!folder.empty()) {
-        if (HMODULE module = LoadLibraryExA((folder + LIBRARY_NAME).c_str(), nullptr,
-                                            LOAD_WITH_ALTERED_SEARCH_PATH))
+        // Its own dependencies from its folder too, and like it never from the working folder.
+        if (HMODULE module =
+                LoadLibraryExW((folder + LIBRARY_NAME).c_str(), nullptr,
+                               LOAD_LIBRARY_SEARCH_DLL_LOAD_DIR | LOAD_LIBRARY_SEARCH_DEFAULT_DIRS))
             return module;
     }
-    return LoadLibraryExA(LIBRARY_NAME, nullptr, LOAD_LIBRARY_SEARCH_DEFAULT_DIRS);
+    return LoadLibraryExW(LIBRARY_NAME, nullptr, LOAD_LIBRARY_SEARCH_DEFAULT_DIRS);
 }
 
 void* librarySymbol(void* handle, const char* name) {
