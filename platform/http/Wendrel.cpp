@@ -44,18 +44,19 @@ WendrelRequest fromUrlText(const QByteArray& method, const QString& text, const 
 
 } // namespace
 
-WendrelTlsSettings WendrelTlsSettings::fromEnvironment() {
-    WendrelTlsSettings settings;
+WendrelSettings WendrelSettings::fromEnvironment() {
+    WendrelSettings settings;
     settings.caFile = qEnvironmentVariable("WENDREL_CA_FILE");
+    settings.pinnedCertificatesFile = qEnvironmentVariable("WENDREL_PINNED_CERTS");
     settings.insecure = qEnvironmentVariable("WENDREL_TLS_INSECURE") == QLatin1String("1");
     return settings;
 }
 
 class Wendrel::WendrelPrivate {
 public:
-    explicit WendrelPrivate(const WendrelTlsSettings& tls)
+    explicit WendrelPrivate(const WendrelSettings& settings)
         : thread(new QThread)
-        , worker(new WendrelWorker(tls)) {
+        , worker(new WendrelWorker(settings)) {
         thread->setObjectName(QStringLiteral("Wendrel"));
         worker->moveToThread(thread);
         // Deferred deletes run as the thread finishes, so the worker dies on its own thread.
@@ -124,10 +125,10 @@ private:
 };
 
 Wendrel::Wendrel()
-    : Wendrel(WendrelTlsSettings::fromEnvironment()) {}
+    : Wendrel(WendrelSettings::fromEnvironment()) {}
 
-Wendrel::Wendrel(const WendrelTlsSettings& tls)
-    : d(std::make_unique<WendrelPrivate>(tls)) {}
+Wendrel::Wendrel(const WendrelSettings& settings)
+    : d(std::make_unique<WendrelPrivate>(settings)) {}
 
 Wendrel::~Wendrel() = default;
 

@@ -1,5 +1,7 @@
 #include "WendrelConnection.h"
 
+#include "WendrelTls.h"
+
 #include <QCryptographicHash>
 #include <QNetworkProxy>
 #include <QSslCertificate>
@@ -53,19 +55,20 @@ QByteArray describe(const QSslCertificate& certificate) {
 
 } // namespace
 
-WendrelConnection::WendrelConnection(const QString& host, quint16 port, bool https,
-                                     const std::optional<QSslConfiguration>& tls,
+WendrelConnection::WendrelConnection(const QString& host, quint16 port, WendrelTls* tls,
                                      qint64 maxBodySize, Dropped dropped, QObject* parent)
     : QObject(parent)
+    , tls(tls)
     , dropped(std::move(dropped))
     , reader(WendrelResponseReader::defaultMaxHeaderSize, maxBodySize) {
-    if (https) {
+    if (tls) {
         auto* ssl = new QSslSocket(this);
-        if (tls)
-            ssl->setSslConfiguration(*tls);
+        if (const std::optional<QSslConfiguration>& configuration = tls->configuration())
+            ssl->setSslConfiguration(*configuration);
         ssl->setReadBufferSize(readChunkSize);
-        // Certificate errors are not ignored: the handshake fails with SslHandshakeFailedError.
-        connect(ssl, &QSslSocket::sslErrors, this, &WendrelConnection::recordTlsErrors);
+        // Certificate errors fail the handshake with SslHandshakeFailedError, unless the server
+        // presents a pinned certificate.
+        connect(ssl, &QSslSocket::sslErrors, this, &WendrelConnection::tlsErrorsFound);
         connect(ssl, &QSslSocket::encrypted, this, &WendrelConnection::connected);
         socket = ssl;
     } else {
@@ -254,14 +257,19 @@ void WendrelConnection::answerRead(qsizetype used, qsizetype size) {
     }
 }
 
-void WendrelConnection::recordTlsErrors(const QList<QSslError>& errors) {
+void WendrelConnection::tlsErrorsFound(const QList<QSslError>& errors) {
+    auto* ssl = static_cast<QSslSocket*>(socket);
+    if (tls->pinned(ssl->peerCertificateChain())) {
+        ssl->ignoreSslErrors();
+        return;
+    }
     tlsErrors.clear();
     for (const QSslError& error : errors) {
         if (!tlsErrors.isEmpty())
             tlsErrors.append("; ");
         tlsErrors.append(WendrelFailure::peerText(error.errorString().toUtf8()));
     }
-    const QSslCertificate peer = static_cast<QSslSocket*>(socket)->peerCertificate();
+    const QSslCertificate peer = ssl->peerCertificate();
     if (!peer.isNull())
         tlsErrors.append(" (peer certificate: " + describe(peer) + ')');
 }

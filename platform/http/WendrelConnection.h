@@ -6,14 +6,13 @@
 #include <QByteArray>
 #include <QList>
 #include <QObject>
-#include <QSslConfiguration>
 #include <QSslError>
 #include <QString>
 
 #include <functional>
-#include <optional>
 
 class QTcpSocket;
+class WendrelTls;
 
 // One HTTP/1.1 connection to one server, kept open between exchanges when the server allows it,
 // carrying one exchange at a time. Lives on Wendrel's worker thread and is used only there.
@@ -44,9 +43,8 @@ public:
 
     static constexpr qint64 readChunkSize = 64 * 1024;
 
-    // tls is set for https: the configuration to use, or nullopt for Qt's default.
-    WendrelConnection(const QString& host, quint16 port, bool https,
-                      const std::optional<QSslConfiguration>& tls, qint64 maxBodySize,
+    // tls is set for https, and outlives the connection.
+    WendrelConnection(const QString& host, quint16 port, WendrelTls* tls, qint64 maxBodySize,
                       Dropped dropped, QObject* parent);
 
     // Sends message, a whole request, while Connecting (it goes out once connected) or Idle.
@@ -72,12 +70,13 @@ private:
     void failed();
     void endOfInput();
     void answerRead(qsizetype used, qsizetype size);
-    void recordTlsErrors(const QList<QSslError>& errors);
+    void tlsErrorsFound(const QList<QSslError>& errors);
     WendrelFailure socketFailure() const;
     WendrelFailure readerFailure() const;
     void finish(WendrelFailure failure);
 
     QTcpSocket* socket = nullptr;
+    const WendrelTls* tls;
     Dropped dropped;
     State current = State::Connecting;
     WendrelResponseReader reader;

@@ -36,9 +36,11 @@ QByteArray WendrelExchange::message(WendrelAuth& auth) {
 WendrelExchange::Next WendrelExchange::next(const WendrelConnection::Outcome& outcome,
                                             WendrelAuth& auth) {
     // A kept-alive connection that the server had closed in the meantime: once more on a new
-    // one, as browsers and Qt do.
+    // one, as cameras close idle connections as a request arrives. Only a GET, which may run
+    // twice (RFC 9110, 9.2.2): a POST that went out may have been acted on.
     if (outcome.failure.failed()) {
-        if (!outcome.answerBegan && outcome.connectionReused && !resent) {
+        if (outcome.failure.error == QNetworkReply::RemoteHostClosedError && !outcome.answerBegan &&
+            outcome.connectionReused && !resent && current.method == "GET") {
             resent = true;
             return {Action::SendOnNewConnection, {}};
         }

@@ -2,6 +2,8 @@
 
 #include "WendrelUrl.h"
 
+#include <algorithm>
+
 namespace {
 
 bool framingHeader(const QByteArray& name) {
@@ -12,7 +14,49 @@ bool framingHeader(const QByteArray& name) {
     return false;
 }
 
+bool hasControl(const QString& text) {
+    return std::any_of(text.begin(), text.end(),
+                       [](QChar c) { return c.unicode() < 0x20 || c.unicode() == 0x7f; });
+}
+
+bool breaksLine(const QString& text) {
+    return std::any_of(text.begin(), text.end(), [](QChar c) {
+        return c == QLatin1Char('\r') || c == QLatin1Char('\n') || c == QLatin1Char('\0');
+    });
+}
+
+// RFC 9110's token: the characters a header name may hold.
+bool isToken(const QString& text) {
+    static const QByteArray SPECIALS = "!#$%&'*+-.^_`|~";
+    return !text.isEmpty() && std::all_of(text.begin(), text.end(), [](QChar c) {
+        const char16_t u = c.unicode();
+        return (u >= 'a' && u <= 'z') || (u >= 'A' && u <= 'Z') || (u >= '0' && u <= '9') ||
+               (u < 128 && SPECIALS.contains(char(u)));
+    });
+}
+
 } // namespace
+
+const char* WendrelRequestWriter::unsafeField(const WendrelRequest& request) {
+    if (request.bearer) {
+        if (breaksLine(request.password))
+            return "the bearer token holds CR, LF or NUL";
+    } else if (hasControl(request.user)) {
+        return "the user name holds a control character";
+    } else if (hasControl(request.password)) {
+        return "the password holds a control character";
+    }
+    for (const QString& header : request.headers) {
+        const qsizetype colon = header.indexOf(QLatin1Char(':'));
+        if (colon < 0 || !isToken(header.left(colon).trimmed()))
+            return "a header name is not an HTTP token";
+        if (breaksLine(header.mid(colon + 1)))
+            return "a header value holds CR, LF or NUL";
+    }
+    if (breaksLine(request.contentType))
+        return "the content type holds CR, LF or NUL";
+    return nullptr;
+}
 
 QByteArray WendrelRequestWriter::write(const WendrelRequest& request, const QByteArray& target,
                                        const QByteArray& authorization) {
@@ -23,7 +67,7 @@ QByteArray WendrelRequestWriter::write(const WendrelRequest& request, const QByt
     for (const QString& header : request.headers) {
         const qsizetype colon = header.indexOf(QLatin1Char(':'));
         const QByteArray name = header.left(colon).trimmed().toLatin1();
-        if (colon > 0 && !framingHeader(name))
+        if (!framingHeader(name))
             result.append(name)
                 .append(": ")
                 .append(header.mid(colon + 1).trimmed().toLatin1())

@@ -13,4 +13,9 @@ public:
     // cookies.
     static QByteArray write(const WendrelRequest& request, const QByteArray& target,
                             const QByteArray& authorization);
+    // The first field the caller gave that could change the request's framing or add to it, in
+    // words; nullptr when there is none. A user name or password may hold no control character,
+    // a header name must be an HTTP token, and a header value, the content type and a bearer
+    // token may hold no CR, LF or NUL.
+    static const char* unsafeField(const WendrelRequest& request);
 };

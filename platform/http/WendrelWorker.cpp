@@ -2,14 +2,18 @@
 
 #include "Wendrel.h"
 #include "WendrelLog.h"
+#include "WendrelRequestWriter.h"
 #include "WendrelUrl.h"
 
 #include <QCoreApplication>
-#include <QSslCertificate>
 
 #include <algorithm>
 #include <climits>
 #include <utility>
+
+#if !defined(_WIN32)
+#include <sys/resource.h>
+#endif
 
 namespace {
 
@@ -18,18 +22,29 @@ qint64 millisecondsSince(std::chrono::steady_clock::time_point then,
     return std::chrono::duration_cast<std::chrono::milliseconds>(now - then).count();
 }
 
+// Half the descriptors the process may open, so that the rest of the host keeps its share.
+int connectionLimit(int wanted) {
+#if !defined(_WIN32)
+    rlimit limit{};
+    if (getrlimit(RLIMIT_NOFILE, &limit) == 0 && limit.rlim_cur != RLIM_INFINITY)
+        wanted = int(std::min<rlim_t>(rlim_t(wanted), limit.rlim_cur / 2));
+#endif
+    return std::max(wanted, 1);
+}
+
 } // namespace
 
-WendrelWorker::WendrelWorker(const WendrelTlsSettings& tls)
-    : caFile(tls.caFile)
-    , insecure(tls.insecure)
-    , deadlineTimer(this) {
+WendrelWorker::WendrelWorker(const WendrelSettings& settings)
+    : tls(settings)
+    , idleTimeout(std::max(settings.idleTimeoutMs, 0))
+    , maxConnections(connectionLimit(settings.maxConnections))
+    , deadlineTimer(this)
+    , idleTimer(this) {
     deadlineTimer.setSingleShot(true);
     deadlineTimer.setTimerType(Qt::PreciseTimer);
     connect(&deadlineTimer, &QTimer::timeout, this, &WendrelWorker::expireDeadlines);
-    if (insecure)
-        wendrelLog().print(KalbLogClient::Failure, __FILE__, __LINE__,
-                           "TLS certificate verification is off: any server is trusted");
+    idleTimer.setSingleShot(true);
+    connect(&idleTimer, &QTimer::timeout, this, &WendrelWorker::closeIdleConnections);
 }
 
 void WendrelWorker::start(WendrelRequest request) {
@@ -40,6 +55,9 @@ void WendrelWorker::start(WendrelRequest request) {
         refusal = {QNetworkReply::HostNotFoundError, "no host given"};
     else if (!WendrelUrl::isHttp(request.url))
         refusal = {QNetworkReply::ProtocolUnknownError, "only http and https are served"};
+    else if (const char* field = WendrelRequestWriter::unsafeField(request))
+        refusal = {QNetworkReply::ProtocolInvalidOperationError,
+                   QByteArray("refused without sending: ") + field};
     else if (request.deadline && *request.deadline <= Clock::now())
         refusal = {QNetworkReply::TimeoutError, "timed out before it could start"};
     if (refusal.failed()) {
@@ -48,19 +66,21 @@ void WendrelWorker::start(WendrelRequest request) {
     }
 
     const Id id = nextId++;
-    QString origin = WendrelUrl::origin(request.url);
-    Origin* slot = &origins[origin];
+    QString key = WendrelUrl::origin(request.url);
+    const auto [found, added] = origins.try_emplace(key);
+    Origin& origin = found->second;
+    if (added)
+        origin.key = key;
+    ++origin.requests;
     const auto deadline =
         request.deadline ? deadlines.emplace(*request.deadline, id) : deadlines.end();
-    pending.emplace(id, Pending{WendrelExchange(std::move(request), std::move(origin)), slot,
+    pending.emplace(id, Pending{WendrelExchange(std::move(request), std::move(key)), &origin,
                                 nullptr, std::nullopt, deadline});
     if (deadline != deadlines.end() && deadline == deadlines.begin())
         armDeadlineTimer();
-
-    if (hasRoom(*slot))
-        launch(id, false);
-    else
-        slot->waiting.push_back(id);
+    // Behind those already waiting for the server.
+    origin.waiting.push_back(id);
+    launchWaiting(origin);
 }
 
 void WendrelWorker::shutdown() {
@@ -75,53 +95,46 @@ void WendrelWorker::shutdown() {
     for (const Id id : ids)
         abortRequest(id, QNetworkReply::OperationCanceledError);
     deadlineTimer.stop();
-    for (auto& origin : origins) {
-        for (WendrelConnection* connection : origin.second.idle)
-            connection->close();
+    idleTimer.stop();
+    for (const Idle& idle : idleConnections)
+        idle.connection->close();
+    idleConnections.clear();
+    for (auto& origin : origins)
         origin.second.idle.clear();
-    }
 }
 
-const std::optional<QSslConfiguration>& WendrelWorker::tlsConfiguration() {
-    if (tlsConfigured)
-        return sslConfiguration;
-    tlsConfigured = true;
-    if (insecure) {
-        QSslConfiguration configuration = QSslConfiguration::defaultConfiguration();
-        configuration.setPeerVerifyMode(QSslSocket::VerifyNone);
-        sslConfiguration = configuration;
-    } else if (!caFile.isEmpty()) {
-        const QList<QSslCertificate> extra = QSslCertificate::fromPath(caFile, QSsl::Pem);
-        if (extra.isEmpty())
-            wendrelLog().print(KalbLogClient::Failure, __FILE__, __LINE__,
-                               "no PEM certificate read from CA file %s", qPrintable(caFile));
-        // Adding certificates stops Qt's on-demand loading of the system's roots: keep them.
-        QSslConfiguration configuration = QSslConfiguration::defaultConfiguration();
-        configuration.setCaCertificates(QSslConfiguration::systemCaCertificates() + extra);
-        sslConfiguration = configuration;
-    }
-    return sslConfiguration;
-}
-
-bool WendrelWorker::hasRoom(const Origin& origin) {
-    return !origin.idle.empty() || origin.open < connectionsPerOrigin;
+// Room for one more exchange with origin's server: an idle connection, or one more under both
+// limits, made by closing the longest idle connection to another server when need be.
+bool WendrelWorker::hasRoom(Origin& origin) {
+    if (!origin.idle.empty())
+        return true;
+    if (origin.open >= connectionsPerOrigin)
+        return false;
+    if (openConnections < maxConnections)
+        return true;
+    if (idleConnections.empty())
+        return false;
+    closeIdle(idleConnections.begin());
+    return true;
 }
 
 void WendrelWorker::launch(Id id, bool newConnection) {
     Pending& entry = pending.at(id);
-    Origin& origin = *entry.slot;
+    Origin& origin = *entry.origin;
     WendrelConnection* connection = nullptr;
     if (!newConnection && !origin.idle.empty()) {
-        connection = origin.idle.back();
+        const IdleList::iterator idle = origin.idle.back();
         origin.idle.pop_back();
+        connection = idle->connection;
+        idleConnections.erase(idle);
     } else {
         const QUrl& url = entry.exchange.request().url;
-        const bool https = WendrelUrl::isHttps(url);
         connection = new WendrelConnection(
-            url.host(), WendrelUrl::port(url), https, https ? tlsConfiguration() : std::nullopt,
+            url.host(), WendrelUrl::port(url), WendrelUrl::isHttps(url) ? &tls : nullptr,
             maxBodySize,
-            [this, slot = entry.slot](WendrelConnection* gone) { dropped(*slot, gone); }, this);
+            [this, server = &origin](WendrelConnection* gone) { dropped(*server, gone); }, this);
         ++origin.open;
+        ++openConnections;
     }
     if (!entry.firstConnection)
         entry.firstConnection = Clock::now();
@@ -135,17 +148,35 @@ void WendrelWorker::launch(Id id, bool newConnection) {
 // A launch never ends inside the call: connections report from the event loop.
 void WendrelWorker::launchWaiting(Origin& origin) {
     const Clock::time_point now = Clock::now();
-    while (!closing && !origin.waiting.empty() && hasRoom(origin)) {
-        const Id id = origin.waiting.front();
-        origin.waiting.pop_front();
-        const auto entry = pending.find(id);
-        if (entry == pending.end())
-            continue;
+    while (!closing && !origin.waiting.empty()) {
+        const auto entry = pending.find(origin.waiting.front());
         // One whose deadline passed while it waited is left to expireDeadlines, unsent.
-        const Deadlines::iterator deadline = entry->second.deadline;
-        if (deadline != deadlines.end() && deadline->first <= now)
+        if (entry == pending.end() ||
+            (entry->second.deadline != deadlines.end() && entry->second.deadline->first <= now)) {
+            origin.waiting.pop_front();
             continue;
-        launch(id, false);
+        }
+        if (!hasRoom(origin)) {
+            // Held by the limit on all connections, not by its own: another server's
+            // connection that closes makes room for it.
+            if (origin.open < connectionsPerOrigin &&
+                std::find(blocked.begin(), blocked.end(), origin.key) == blocked.end())
+                blocked.push_back(origin.key);
+            return;
+        }
+        origin.waiting.pop_front();
+        launch(entry->first, false);
+    }
+}
+
+// Room under the limit on all connections, or an idle connection to close for it.
+void WendrelWorker::launchBlocked() {
+    while (!closing && !blocked.empty() &&
+           (openConnections < maxConnections || !idleConnections.empty())) {
+        const auto found = origins.find(blocked.front());
+        blocked.pop_front();
+        if (found != origins.end())
+            launchWaiting(found->second);
     }
 }
 
@@ -153,14 +184,17 @@ void WendrelWorker::exchangeEnded(Id id, WendrelConnection* connection,
                                   WendrelConnection::Outcome outcome) {
     Pending& entry = pending.at(id);
     entry.connection = nullptr;
-    Origin& origin = *entry.slot;
-    // One that cannot carry another exchange has closed itself.
-    if (connection->state() == WendrelConnection::State::Idle)
-        origin.idle.push_back(connection);
-    else
-        --origin.open;
-
+    Origin& origin = *entry.origin;
     const WendrelExchange::Next next = entry.exchange.next(outcome, authentication);
+    // One that cannot carry another exchange has closed itself.
+    if (connection->state() == WendrelConnection::State::Idle) {
+        idleConnections.push_back({connection, &origin, Clock::now()});
+        origin.idle.push_back(std::prev(idleConnections.end()));
+        if (!idleTimer.isActive())
+            armIdleTimer();
+    } else {
+        closed(origin);
+    }
     switch (next.action) {
     case WendrelExchange::Action::Send:
         launch(id, false);
@@ -173,14 +207,54 @@ void WendrelWorker::exchangeEnded(Id id, WendrelConnection* connection,
     }
     complete(id, next.failure, outcome.answer.headers, outcome.answer.body, outcome.reachedServer);
     launchWaiting(origin);
+    launchBlocked();
+    forgetIfUnused(origin);
 }
 
 void WendrelWorker::dropped(Origin& origin, WendrelConnection* connection) {
     connection->close();
-    origin.idle.erase(std::remove(origin.idle.begin(), origin.idle.end(), connection),
-                      origin.idle.end());
-    --origin.open;
+    const auto idle =
+        std::find_if(origin.idle.begin(), origin.idle.end(),
+                     [connection](IdleList::iterator it) { return it->connection == connection; });
+    if (idle != origin.idle.end()) {
+        idleConnections.erase(*idle);
+        origin.idle.erase(idle);
+    }
+    closed(origin);
     launchWaiting(origin);
+    launchBlocked();
+    forgetIfUnused(origin);
+}
+
+void WendrelWorker::closed(Origin& origin) {
+    --origin.open;
+    --openConnections;
+}
+
+void WendrelWorker::closeIdle(IdleList::iterator idle) {
+    Origin& origin = *idle->origin;
+    idle->connection->close();
+    origin.idle.erase(std::find(origin.idle.begin(), origin.idle.end(), idle));
+    idleConnections.erase(idle);
+    closed(origin);
+    forgetIfUnused(origin);
+}
+
+void WendrelWorker::closeIdleConnections() {
+    const Clock::time_point now = Clock::now();
+    while (!idleConnections.empty() && idleConnections.front().since + idleTimeout <= now)
+        closeIdle(idleConnections.begin());
+    armIdleTimer();
+}
+
+// A server's entry lives while it has a connection or a request. Entries stay once the worker
+// is closing: a callback that destroys the client runs inside calls that still use them.
+void WendrelWorker::forgetIfUnused(Origin& origin) {
+    if (closing || origin.open > 0 || origin.requests > 0)
+        return;
+    const QString key = origin.key;
+    blocked.erase(std::remove(blocked.begin(), blocked.end(), key), blocked.end());
+    origins.erase(key);
 }
 
 void WendrelWorker::abortRequest(Id id, QNetworkReply::NetworkError reason) {
@@ -188,19 +262,20 @@ void WendrelWorker::abortRequest(Id id, QNetworkReply::NetworkError reason) {
     if (found == pending.end())
         return;
     Pending& entry = found->second;
+    Origin& origin = *entry.origin;
     const WendrelFailure failure = abortFailure(entry, reason);
     WendrelConnection* connection = std::exchange(entry.connection, nullptr);
-    if (!connection) {
-        // Still waiting for its turn: its place in the queue is skipped later.
-        complete(id, failure, {}, {}, false);
-        return;
+    bool reachedServer = false;
+    if (connection) {
+        reachedServer = connection->reachedServer();
+        connection->close();
+        closed(origin);
     }
-    Origin& origin = *entry.slot;
-    const bool reachedServer = connection->reachedServer();
-    connection->close();
-    --origin.open;
+    // One still waiting for its turn leaves its place in the queue, skipped later.
     complete(id, failure, {}, {}, reachedServer);
     launchWaiting(origin);
+    launchBlocked();
+    forgetIfUnused(origin);
 }
 
 WendrelFailure WendrelWorker::abortFailure(const Pending& entry,
@@ -213,12 +288,10 @@ WendrelFailure WendrelWorker::abortFailure(const Pending& entry,
         "timed out after " + QByteArray::number(millisecondsSince(request.submitted, now)) + " ms ";
     if (!entry.firstConnection)
         return {reason, text + "waiting for a free connection (" +
-                            QByteArray::number(connectionsPerOrigin) +
-                            " to this server, all busy)"};
-    if (entry.connection)
-        text += entry.connection->activity();
-    else
-        text += "between attempts";
+                            QByteArray::number(entry.origin->open) + " open to this server, " +
+                            QByteArray::number(openConnections) + " of " +
+                            QByteArray::number(maxConnections) + " in all)"};
+    text += entry.connection ? entry.connection->activity() : QByteArray("between attempts");
     return {reason,
             text + " (it waited " +
                 QByteArray::number(millisecondsSince(request.submitted, *entry.firstConnection)) +
@@ -232,6 +305,7 @@ void WendrelWorker::complete(Id id, const WendrelFailure& failure, const QByteAr
     pending.erase(found);
     if (entry.deadline != deadlines.end())
         deadlines.erase(entry.deadline);
+    --entry.origin->requests;
     answer(entry.exchange.request(), failure, headers, body, reachedServer);
 }
 
@@ -255,16 +329,25 @@ void WendrelWorker::armDeadlineTimer() {
     deadlineTimer.start(static_cast<int>(std::clamp<qint64>(wait.count(), 0, INT_MAX)));
 }
 
+void WendrelWorker::armIdleTimer() {
+    if (idleConnections.empty()) {
+        idleTimer.stop();
+        return;
+    }
+    const auto wait = std::chrono::ceil<std::chrono::milliseconds>(idleConnections.front().since +
+                                                                   idleTimeout - Clock::now());
+    idleTimer.start(static_cast<int>(std::clamp<qint64>(wait.count(), 0, INT_MAX)));
+}
+
 void WendrelWorker::answer(const WendrelRequest& request, const WendrelFailure& failure,
                            const QByteArray& headers, const QByteArray& body, bool reachedServer) {
-    if (failure.failed()) {
+    if (failure.failed())
         wendrelLog().print(
             KalbLogClient::Failure, __FILE__, __LINE__, "%s %s failed after %lld ms: %s",
             WendrelFailure::peerText(request.method).constData(),
             WendrelFailure::peerText(WendrelUrl::forLog(request.url)).constData(),
             static_cast<long long>(millisecondsSince(request.submitted, Clock::now())),
             failure.reason.constData());
-    }
     if (!request.callback)
         return;
     // Nothing may unwind into the event loop.

@@ -1,16 +1,24 @@
 // Hostile values end to end: what the simulated camera and VCA plugin actually received.
+#include "AnswerLedger.h"
 #include "CameraCommands.h"
 #include "CamsimProcess.h"
+#include "FakeFrameworkTools.h"
+#include "PluginQuenvar.h"
 #include "ServedHost.h"
 
 #include <QDir>
 #include <QFile>
 #include <QJsonDocument>
+#include <QTcpServer>
+#include <QTcpSocket>
 #include <QTemporaryDir>
 #include <QUrlQuery>
 #include <QXmlStreamReader>
 
 #include <gtest/gtest.h>
+
+#include <memory>
+#include <utility>
 
 namespace {
 
@@ -136,4 +144,50 @@ TEST_F(HostileInputTest, CameraAndLocationIdentifiersReachTheVcaPluginEscaped) {
     EXPECT_EQ(sentToVca("GetVCARules", "Cam"), camera.toStdString());
     EXPECT_EQ(sentToVca("GetRecordingVCARules", "Loc"), locations.join('\n').toStdString());
     EXPECT_EQ(sentToVca("GetRecordingVCARules", "QueryTime"), "7");
+}
+
+// Credentials that would add to a camera request's header lines: every camera command is
+// answered with the failure result, once, and nothing reaches the camera, which challenges every
+// request for Digest credentials.
+TEST(HostileCredentialsTest, NoCameraCommandSendsCredentialsThatBreakTheLine) {
+    QTcpServer camera;
+    ASSERT_TRUE(camera.listen(QHostAddress::LocalHost, 0));
+    int connections = 0;
+    QObject::connect(&camera, &QTcpServer::newConnection, &camera, [&camera, &connections] {
+        while (QTcpSocket* socket = camera.nextPendingConnection()) {
+            ++connections;
+            QObject::connect(socket, &QTcpSocket::readyRead, socket, [socket] {
+                socket->readAll();
+                socket->write("HTTP/1.1 401 Unauthorized\r\nWWW-Authenticate: Digest "
+                              "realm=\"cam\", nonce=\"n\", qop=\"auth\"\r\n"
+                              "Content-Length: 0\r\n\r\n");
+            });
+        }
+    });
+    FakeFrameworkTools tools;
+    auto plugin = std::make_unique<PluginQuenvar>();
+    ASSERT_TRUE(plugin->InitialPluginBase(&tools));
+    const std::pair<QString, QString> credentials[] = {
+        {"admin\"\r\n\r\nGET /cgi-bin/admin/setparam.cgi?system_password=pwned HTTP/1.1\r\n"
+         "Host: cam\r\nX-Smuggled: ",
+         "pw"},
+        {"admin", "pw\nX-Smuggled: 1"},
+        {QString::fromLatin1("admin\0", 6), "pw"}};
+    AnswerLedger ledger;
+    int id = 0;
+    for (const auto& [user, password] : credentials) {
+        for (const CameraCommand& command : cameraCommands()) {
+            QVariantMap params = command.to(camera.serverPort(), password);
+            params.insert("user", user);
+            plugin->Request(command.name, params, RequestSenderInfo(), ledger.callback(id++));
+        }
+    }
+    ASSERT_TRUE(ledger.waitForAll(5000));
+    plugin.reset();
+    for (int i = 0; i < id; ++i) {
+        const AnswerLedger::Entry entry = ledger.entry(i);
+        EXPECT_EQ(entry.calls, 1) << i;
+        EXPECT_EQ(entry.first.value("code").toString(), "-1") << i;
+    }
+    EXPECT_EQ(connections, 0);
 }

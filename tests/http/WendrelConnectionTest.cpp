@@ -1,6 +1,7 @@
 // How Wendrel's connections deal with what servers send, against a server that sends exactly what
 // a case scripts: kept-alive connections, a server that closes one, bodies in every framing,
 // interim answers, malformed answers and redirects; and what goes on the wire.
+#include "EventLoopWait.h"
 #include "ReplyRecorder.h"
 #include "Wendrel.h"
 
@@ -12,6 +13,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -46,13 +48,19 @@ public:
         connect(this, &QTcpServer::newConnection, this, [this] {
             while (QTcpSocket* socket = nextPendingConnection()) {
                 const int connection = ++connections;
+                ++open;
                 connect(socket, &QTcpSocket::readyRead, socket,
                         [this, socket, connection] { answer(socket, connection); });
+                connect(socket, &QTcpSocket::disconnected, socket, [this, socket] {
+                    --open;
+                    socket->deleteLater();
+                });
             }
         });
     }
 
     int connections = 0;
+    int open = 0; // connections the client has not closed
     // The number of its connection (from 1), method and target of each request, joined by "; ".
     std::string received;
     std::vector<std::string> requests; // whole
@@ -144,10 +152,17 @@ INSTANTIATE_TEST_SUITE_P(
         Case{"KeptAlive", script(ok("a"), ok("b"), ok("c")), "GET POST GET",
              "NoError reached: a; NoError reached: b; NoError reached: c", 1,
              "1 GET /0; 1 POST /1; 1 GET /2"},
-        // A server may close a kept-alive connection just as the next request goes out: that
-        // request goes again on a new connection, once.
+        // A server may close a kept-alive connection just as the next request goes out: a GET
+        // goes again on a new connection, once; a POST may have been acted on, and fails.
         Case{"ClosedBeforeAnswering", script(ok("a"), Reply("", true), ok("b")), "GET GET",
              "NoError reached: a; NoError reached: b", 2, "1 GET /0; 1 GET /1; 2 GET /1"},
+        Case{"ClosedBeforeAnsweringAPost", script(ok("a"), Reply("", true), ok("b")),
+             "GET POST GET",
+             "NoError reached: a; RemoteHostClosedError reached; NoError reached: b", 2,
+             "1 GET /0; 1 POST /1; 2 GET /2"},
+        Case{"ClosedTwiceBeforeAnswering", script(ok("a"), Reply("", true), Reply("", true)),
+             "GET GET", "NoError reached: a; RemoteHostClosedError reached", 2,
+             "1 GET /0; 1 GET /1; 2 GET /1"},
         // Closed by the server, or to be closed by it: never used again.
         Case{"NotReusedOnceClosed",
              script(Reply(ok("a").bytes, true),
@@ -210,6 +225,115 @@ TEST(WendrelRequestTest, SendsTheHeadersAskedForAndNoCredentialsUnasked) {
                   EndsWith("\r\n\r\na=1"))));
     for (const char* credentials : {"operator", "s3cret", "Basic", "Digest"})
         EXPECT_THAT(server.requests, Each(Not(HasSubstr(credentials))));
+}
+
+// What a caller gives that would reach the wire as more than its own field: refused before any
+// connection, answered once.
+struct UnsafeCase {
+    const char* name;
+    std::function<void(Wendrel&, quint16, const HttpReplyCallback&)> send;
+};
+
+class WendrelUnsafeFieldTest : public ::testing::TestWithParam<UnsafeCase> {};
+
+TEST_P(WendrelUnsafeFieldTest, IsRefusedWithoutSendingAnything) {
+    ScriptedServer server(script(ok("a")));
+    ReplyRecorder recorder;
+    {
+        Wendrel client;
+        GetParam().send(client, server.serverPort(), recorder.callback());
+        ASSERT_TRUE(recorder.waitFor(1));
+    }
+    EXPECT_EQ(recorder.said(), std::vector<std::string>{"ProtocolInvalidOperationError unreached"});
+    EXPECT_EQ(server.connections, 0);
+}
+
+const QString SMUGGLED =
+    QStringLiteral("\r\n\r\nGET /cgi-bin/admin/setparam.cgi?system_password=pwned "
+                   "HTTP/1.1\r\nHost: cam\r\nContent-Length: 60\r\nX-Smuggled: ");
+
+std::function<void(Wendrel&, quint16, const HttpReplyCallback&)>
+getAs(const QString& user, const QString& password, const QStringList& headers = {}) {
+    return [=](Wendrel& client, quint16 port, const HttpReplyCallback& callback) {
+        client.Get(HOST, "/x", port, false, user, password, callback, 5000, headers);
+    };
+}
+
+std::function<void(Wendrel&, quint16, const HttpReplyCallback&)>
+postAs(const QString& contentType) {
+    return [=](Wendrel& client, quint16 port, const HttpReplyCallback& callback) {
+        client.Post(HOST, "a=1", "/x", port, false, "admin", "pw", contentType, callback, 5000);
+    };
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Fields, WendrelUnsafeFieldTest,
+    ::testing::Values(
+        UnsafeCase{"UserNameWithLineBreaks", getAs("admin\"" + SMUGGLED, "pw")},
+        UnsafeCase{"UserNameWithNul", getAs(QString::fromLatin1("adm\0in", 6), "pw")},
+        UnsafeCase{"UserNameWithOtherControl", getAs("adm\x1bin", "pw")},
+        UnsafeCase{"PasswordWithLineFeed", getAs("admin", "pw\nX-Smuggled: 1")},
+        UnsafeCase{"PasswordWithDelete", getAs("admin", "pw\x7f")},
+        UnsafeCase{"HeaderNameNotAToken", getAs("", "", {"X Probe: 1"})},
+        UnsafeCase{"HeaderNameWithLineBreak", getAs("", "", {"X-A\r\nX-B: 1"})},
+        UnsafeCase{"HeaderWithoutName", getAs("", "", {": 1"})},
+        UnsafeCase{"HeaderWithoutColon", getAs("", "", {"X-Probe"})},
+        UnsafeCase{"HeaderValueWithLineBreak", getAs("", "", {"X-Probe: 1" + SMUGGLED})},
+        UnsafeCase{"HeaderValueWithNul", getAs("", "", {QString::fromLatin1("X-Probe: 1\0", 12)})},
+        UnsafeCase{"ContentTypeWithLineBreak", postAs("text/plain\r\nX-Smuggled: 1")},
+        UnsafeCase{"BearerTokenWithLineBreak",
+                   [](Wendrel& client, quint16 port, const HttpReplyCallback& callback) {
+                       client.PostWithOAuth(HOST, "a=1", "/x", port, false, {}, "t0ken" + SMUGGLED,
+                                            FORM, callback, 5000);
+                   }},
+        UnsafeCase{"UrlCredentialsWithLineBreak",
+                   [](Wendrel& client, quint16 port, const HttpReplyCallback& callback) {
+                       client.Get("http://admin%0D%0AX-Smuggled:%201:pw@127.0.0.1:" +
+                                      QString::number(port) + "/x",
+                                  {}, {}, callback, 5000);
+                   }}),
+    [](const ::testing::TestParamInfo<UnsafeCase>& info) { return std::string(info.param.name); });
+
+// Callers share the connections to a camera: one caller's hostile request cannot put anything in
+// front of another's, nor take its answer.
+TEST(WendrelSharedPoolTest, AHostileCallerCannotReachAnotherCallersRequest) {
+    ScriptedServer server(script(ok("first"), ok("second")));
+    ReplyRecorder recorder;
+    {
+        Wendrel client;
+        client.Get(HOST, "/0", server.serverPort(), false, "viewer", "pw", recorder.callback(0),
+                   5000, {});
+        ASSERT_TRUE(recorder.waitFor(1));
+        client.Get(HOST, "/1", server.serverPort(), false, "admin\"" + SMUGGLED, "pw",
+                   recorder.callback(1), 5000, {});
+        client.Post(HOST, "a=1", "/2", server.serverPort(), false, "viewer", "pw",
+                    "text/plain\r\nContent-Length: 0\r\n\r\nGET /smuggled HTTP/1.1",
+                    recorder.callback(2), 5000);
+        client.Get(HOST, "/3", server.serverPort(), false, "viewer", "pw", recorder.callback(3),
+                   5000, {});
+        ASSERT_TRUE(recorder.waitFor(4));
+    }
+    EXPECT_EQ(recorder.said(), (std::vector<std::string>{"NoError reached: first",
+                                                         "ProtocolInvalidOperationError unreached",
+                                                         "ProtocolInvalidOperationError unreached",
+                                                         "NoError reached: second"}));
+    EXPECT_EQ(server.received, "1 GET /0; 1 GET /3");
+}
+
+// Kept-alive connections do not outlive the idle time-out, whether a server closes them or not.
+TEST(WendrelIdleTest, IdleConnectionsAreClosedAfterTheIdleTimeOut) {
+    ScriptedServer server(script(ok("a"), ok("b"), ok("c")));
+    ReplyRecorder recorder;
+    WendrelSettings settings;
+    settings.idleTimeoutMs = 200;
+    Wendrel client(settings);
+    for (int id = 0; id < 3; ++id)
+        client.Get(HOST, "/" + QString::number(id), server.serverPort(), false, {}, {},
+                   recorder.callback(id), 5000, {});
+    ASSERT_TRUE(recorder.waitFor(3));
+    ASSERT_GE(server.open, 1);
+    EXPECT_TRUE(runEventLoopUntil([&server] { return server.open == 0; }, 5000))
+        << server.open << " still open";
 }
 
 } // namespace

@@ -16,6 +16,7 @@
 #include <gtest/gtest.h>
 
 #include <memory>
+#include <ostream>
 
 namespace {
 
@@ -82,17 +83,21 @@ struct Case {
     const char* reason; // a regular expression for the reason the log gives
 };
 
+void PrintTo(const Case& c, std::ostream* out) {
+    *out << c.name;
+}
+
 class WendrelLogTest : public ::testing::TestWithParam<Case> {
 protected:
     // Makes one request that fails, and returns the lines the log gained.
     QStringList failOnce(quint16 port, bool https, QNetworkReply::NetworkError expected,
-                         uint timeout = 5000) {
+                         uint timeout = 5000, const QString& user = USER) {
         const qsizetype before = logText().size();
         ReplyRecorder recorder;
         {
             Wendrel client;
             client.Get(HOST, QStringLiteral("/cgi-bin/admin/getparam.cgi?system_password=x"), port,
-                       https, USER, PASSWORD, recorder.callback(), timeout, {});
+                       https, user, PASSWORD, recorder.callback(), timeout, {});
             EXPECT_TRUE(recorder.waitFor(1));
         }
         EXPECT_EQ(recorder.first().error, expected);
@@ -164,6 +169,16 @@ TEST_F(WendrelLogTest, SaysHowLongASilentServerWasWaitedFor) {
                   "http",
                   R"(timed out after \d+ ms waiting for the answer \(it waited \d+ ms for a )"
                   R"(connection\))");
+}
+
+TEST_F(WendrelLogTest, NamesAnUnsafeFieldWithoutItsValue) {
+    FixedServer server("HTTP/1.1 200 OK" + EMPTY_BODY, new QTcpServer);
+    const QStringList lines =
+        failOnce(server.port(), false, QNetworkReply::ProtocolInvalidOperationError, 5000,
+                 USER + "\r\nX-Smuggled: 1");
+    expectOneLine(lines, server.port(), "http",
+                  "refused without sending: the user name holds a control character");
+    EXPECT_FALSE(lines.join('\n').contains("Smuggled"));
 }
 
 TEST_F(WendrelLogTest, NamesTheUntrustedCertificate) {

@@ -1,6 +1,8 @@
 #include "Wendrel.h"
 
+#include "BuildPaths.h"
 #include "CamsimProcess.h"
+#include "EventLoopWait.h"
 #include "ReplyRecorder.h"
 #include "WendrelWorker.h"
 
@@ -8,6 +10,7 @@
 #include <QHostAddress>
 #include <QProcess>
 #include <QTcpServer>
+#include <QTcpSocket>
 #include <QTemporaryDir>
 
 #include <gmock/gmock.h>
@@ -226,6 +229,88 @@ TEST_F(WendrelTest, CertificatesAreVerifiedUnlessTrusted) {
     const std::string refused = "SslHandshakeFailedError unreached";
     EXPECT_EQ(recorder.said(), (Said{refused, refused, IDLE, IDLE}));
     EXPECT_EQ(camsim->logLines().size(), 2u);
+}
+
+// A pinned certificate is trusted as the identity of the camera that presents it, whatever name
+// the camera was reached by, and vouches for nothing else; a CA file's certificate vouches for
+// what it signed.
+TEST_F(WendrelTest, APinnedCertificateIsTrustedAsItselfOnly) {
+    QTemporaryDir folder;
+    const auto path = [&folder](const char* name) { return folder.filePath(name); };
+    const auto openssl = [](const QStringList& arguments) {
+        return QProcess::execute("openssl", arguments) == 0;
+    };
+    // The camera's own self-signed certificate, named otherwise than the address used; and one
+    // that its key signed for that address.
+    ASSERT_TRUE(
+        openssl({"req", "-x509", "-newkey", "ec", "-pkeyopt", "ec_paramgen_curve:prime256v1",
+                 "-nodes", "-days", "2", "-subj", "/CN=camera-7", "-keyout", path("pinned.key"),
+                 "-out", path("pinned.pem")}));
+    ASSERT_TRUE(openssl({"req", "-new", "-newkey", "ec", "-pkeyopt", "ec_paramgen_curve:prime256v1",
+                         "-nodes", "-subj", "/CN=127.0.0.1", "-keyout", path("issued.key"), "-out",
+                         path("issued.csr")}));
+    QFile extensions(path("issued.ext"));
+    ASSERT_TRUE(extensions.open(QIODevice::WriteOnly) &&
+                extensions.write("subjectAltName=IP:127.0.0.1\n") > 0);
+    extensions.close();
+    ASSERT_TRUE(openssl({"x509", "-req", "-in", path("issued.csr"), "-CA", path("pinned.pem"),
+                         "-CAkey", path("pinned.key"), "-CAcreateserial", "-days", "2", "-extfile",
+                         path("issued.ext"), "-out", path("issued.pem")}));
+    const CamsimProcess pinnedCamera(
+        {"--tls-cert", path("pinned.pem"), "--tls-key", path("pinned.key")});
+    const CamsimProcess issuedCamera(
+        {"--tls-cert", path("issued.pem"), "--tls-key", path("issued.key")});
+    ASSERT_NE(pinnedCamera.port(), 0) << qPrintable(pinnedCamera.error());
+    ASSERT_NE(issuedCamera.port(), 0) << qPrintable(issuedCamera.error());
+
+    const struct {
+        const CamsimProcess& camera;
+        const char* pins;
+        const char* caFile;
+        const char* said;
+    } rows[] = {
+        {pinnedCamera, "pinned.pem", "", IDLE.c_str()},
+        {issuedCamera, "pinned.pem", "", "SslHandshakeFailedError unreached"},
+        {pinnedCamera, "", "", "SslHandshakeFailedError unreached"},
+        {issuedCamera, "", "pinned.pem", IDLE.c_str()},
+    };
+    Said expected;
+    int id = 0;
+    for (const auto& row : rows) {
+        WendrelSettings settings;
+        settings.pinnedCertificatesFile = *row.pins ? path(row.pins) : QString();
+        settings.caFile = *row.caFile ? path(row.caFile) : QString();
+        Wendrel client(settings);
+        client.Get(CamsimProcess::host(), GETPARAM, row.camera.port(), true, {}, {},
+                   recorder.callback(id), TIMEOUT_MS, {});
+        ASSERT_TRUE(recorder.waitFor(++id));
+        expected.push_back(row.said);
+    }
+    EXPECT_EQ(recorder.said(), expected);
+}
+
+// With few descriptors to spare, many cameras one after another: idle connections to earlier
+// cameras are closed to make room, so that every request succeeds.
+TEST(WendrelLimitTest, ManyCamerasWithFewDescriptors) {
+    // Every loopback address reaches it: each address is a camera of its own.
+    QTcpServer server;
+    ASSERT_TRUE(server.listen(QHostAddress::AnyIPv4, 0));
+    QObject::connect(&server, &QTcpServer::newConnection, &server, [&server] {
+        while (QTcpSocket* socket = server.nextPendingConnection()) {
+            QObject::connect(socket, &QTcpSocket::readyRead, socket, [socket] {
+                if (socket->readAll().contains("\r\n\r\n"))
+                    socket->write("HTTP/1.1 200 OK\r\nContent-Length: 2\r\n\r\nok");
+            });
+            QObject::connect(socket, &QTcpSocket::disconnected, socket, &QObject::deleteLater);
+        }
+    });
+    QProcess probe;
+    probe.start(BuildPaths::bin(QStringLiteral("wendrel-limit-probe")),
+                {QString::number(server.serverPort()), QStringLiteral("1000")});
+    ASSERT_TRUE(
+        runEventLoopUntil([&probe] { return probe.state() == QProcess::NotRunning; }, 120000));
+    EXPECT_EQ(probe.exitStatus(), QProcess::NormalExit);
+    EXPECT_EQ(probe.exitCode(), 0) << probe.readAllStandardOutput().constData();
 }
 
 TEST_F(WendrelTest, UnreachableAddressesAreAnsweredOnceWithoutReachingAServer) {
