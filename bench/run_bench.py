@@ -32,6 +32,8 @@ IN_FLIGHT = 64
 # against wrk's 5 s; the Qt-only reference, some 15 times slower, runs a tenth of it.
 CAMERA_OPERATIONS = 200000
 MEMORY_OPERATIONS = 10000
+IDLE_CAMERAS = 10000
+IDLE_MS = 2000
 WRK_SECONDS = 5
 GBENCH_ARGS = [
     "--benchmark_repetitions=5",
@@ -97,15 +99,21 @@ class Nginx:
     """nginx in the foreground, as the current user, listening on free loopback ports and
     answering the camera's stop path with a fixed body."""
 
-    def __init__(self, folder, port_count):
+    def __init__(self, folder, port_count, every_loopback_address=False):
         self.folder = folder
         self.port_count = port_count
+        self.every_loopback_address = every_loopback_address
         self.process = None
         self.ports = []
 
     def config(self):
         folder = self.folder
-        listens = "\n".join(f"        listen 127.0.0.1:{port};" for port in self.ports)
+        # On every address, so that each of 127.0.0.0/8 is a camera of its own; answering
+        # loopback peers only.
+        address = "" if self.every_loopback_address else "127.0.0.1:"
+        listens = "\n".join(f"        listen {address}{port};" for port in self.ports)
+        if self.every_loopback_address:
+            listens += "\n        allow 127.0.0.0/8;\n        deny all;"
         return f"""worker_processes 1;
 daemon off;
 pid {folder}/nginx.pid;
@@ -269,6 +277,13 @@ def memory(build, ports, results, tag):
     return json.loads(run(command, os.path.join(results, f"memory-{tag}.log"), 60))
 
 
+def idle(build, port, results):
+    command = [os.path.join(build, "bin", "quenvar-bench-idle"), "--port", str(port),
+               "--cameras", str(IDLE_CAMERAS), "--in-flight", str(IN_FLIGHT),
+               "--idle-ms", str(IDLE_MS)]
+    return json.loads(run(command, os.path.join(results, "idle.log"), 120))
+
+
 class Table:
     def __init__(self):
         self.rows = []
@@ -375,6 +390,26 @@ def memory_rows(table, report, what):
               "all, once, within 1 s", all_false and in_time)
 
 
+def idle_rows(table, report):
+    cameras = report["cameras"]
+    wait = f"{report['idleMs'] / 1000 + 1:g} s"
+    table.add(f"Idle: {cameras:,} distinct cameras, one request each, then open connections after "
+              f"the idle time-out ({report['idleMs'] / 1000:g} s) plus 1 s",
+              f"{report['openAfterIdle']} open ({report['openAtEnd']} at the end of the run, "
+              f"{report['failed']} failed, {cameras / report['seconds']:,.0f} requests/s)",
+              "—", "—", "0 open, none failed",
+              report["openAfterIdle"] == 0 and report["failed"] == 0)
+    warm = report["warmBytes"]
+    after = report["afterBytes"]
+    ratio = after / warm
+    table.add(f"Idle: resident memory {wait} after those {cameras:,} cameras "
+              "(the allocator's free memory given back first)",
+              f"{after / 2**20:,.1f} MiB (peak {report['peakBytes'] / 2**20:,.1f} MiB)",
+              f"after a first round of {report['warmup']:,} other cameras: {warm / 2**20:,.1f} MiB "
+              f"(before any: {report['coldBytes'] / 2**20:,.1f} MiB)", f"{ratio:.2f}", "<= 1.1",
+              ratio <= 1.1)
+
+
 def machine():
     model = platform.processor() or "unknown CPU"
     try:
@@ -428,6 +463,10 @@ def main():
                 many = camera_load(build, nginx.ports, results, str(CAMERA_PORTS))
                 qt_only = camera_load(build, nginx.ports[:1], results, "qt-only", qt_only=True)
         camera_rows(table, baseline, one, many, qt_only)
+        with tempfile.TemporaryDirectory(prefix="quenvar-nginx-") as folder:
+            step(f"{IDLE_CAMERAS:,} distinct cameras, then idle")
+            with Nginx(folder, 1, every_loopback_address=True) as nginx:
+                idle_rows(table, idle(build, nginx.ports[0], results))
         for ports, what in ((1, "1 camera that accepts and never answers"),
                             (CAMERA_PORTS, f"{CAMERA_PORTS} cameras that accept and never answer")):
             step(f"memory and deadlines, {ports} camera(s)")
