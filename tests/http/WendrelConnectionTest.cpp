@@ -51,7 +51,8 @@ public:
                 ++open;
                 connect(socket, &QTcpSocket::readyRead, socket,
                         [this, socket, connection] { answer(socket, connection); });
-                connect(socket, &QTcpSocket::disconnected, socket, [this, socket] {
+                // Not while the server goes: its sockets close as it deletes them.
+                connect(socket, &QTcpSocket::disconnected, this, [this, socket] {
                     --open;
                     socket->deleteLater();
                 });
