@@ -156,7 +156,7 @@ const std::optional<QSslConfiguration>& WendrelWorker::tlsConfiguration() {
 
 // The whole request. Nothing carries over from one request to the next: no credentials but the
 // request's own (WendrelAuth answers challenges), and no cookies.
-QByteArray WendrelWorker::message(const Pending& entry, const QByteArray& authorization) {
+QByteArray WendrelWorker::message(Pending& entry, const QByteArray& authorization) {
     const WendrelRequest& request = entry.request;
     const QByteArray target = WendrelAuth::target(request.url);
     QByteArray result;
@@ -181,6 +181,7 @@ QByteArray WendrelWorker::message(const Pending& entry, const QByteArray& author
                                     ? authentication.before(entry.origin, request.method, target,
                                                             request.user, request.password)
                                     : authorization;
+        entry.digestSent = sent.startsWith("Digest ");
         if (!sent.isEmpty())
             result.append("Authorization: ").append(sent).append("\r\n");
     }
@@ -251,6 +252,8 @@ void WendrelWorker::exchangeEnded(Id id, WendrelConnection* connection,
         launch(id, {});
         return;
     }
+    if (answer.error == QNetworkReply::NoError && answer.status != 401 && entry.digestSent)
+        authentication.accepted(entry.origin, entry.request.user, entry.request.password);
     if (answer.error == QNetworkReply::NoError && !closing) {
         if (answer.status == 401 && answerChallenge(id, answer.challenges))
             return;
@@ -291,13 +294,18 @@ bool WendrelWorker::answerChallenge(Id id, const QByteArray& challenges) {
         authentication.forget(entry.origin, request.user, request.password);
         return false;
     }
-    const QByteArray authorization =
-        authentication.answer(entry.origin, challenges, request.method,
-                              WendrelAuth::target(request.url), request.user, request.password);
-    if (authorization.isEmpty())
+    const WendrelAuth::Answer answered = authentication.answer(
+        entry.origin, challenges, request.method, WendrelAuth::target(request.url), request.user,
+        request.password, WendrelUrl::isHttps(request.url));
+    if (answered.refusal == WendrelAuth::Answer::Refusal::Downgrade)
+        wendrelLog().print(KalbLogClient::Failure, __FILE__, __LINE__,
+                           "downgrade refused: Basic asked at %s over plain HTTP, where Digest "
+                           "had worked with the same credentials",
+                           qPrintable(entry.origin));
+    if (answered.authorization.isEmpty())
         return false;
     entry.challengeAnswered = true;
-    launch(id, authorization);
+    launch(id, answered.authorization);
     return true;
 }
 

@@ -49,6 +49,7 @@ private:
         Origin* slot = nullptr;
         WendrelConnection* connection = nullptr; // none while waiting for its turn
         bool challengeAnswered = false;
+        bool digestSent = false; // the last send carried a Digest answer
         bool resent = false;
         int redirects = 0;
         Deadlines::iterator deadline;
@@ -61,7 +62,7 @@ private:
     };
 
     const std::optional<QSslConfiguration>& tlsConfiguration();
-    QByteArray message(const Pending& entry, const QByteArray& authorization);
+    QByteArray message(Pending& entry, const QByteArray& authorization);
     static bool hasRoom(const Origin& origin);
     void launch(Id id, const QByteArray& authorization);
     void launchWaiting(Origin& origin);
