@@ -4,6 +4,7 @@
 
 #include <gtest/gtest.h>
 
+#include <ostream>
 #include <string>
 #include <vector>
 
@@ -104,6 +105,11 @@ const Exchange EXCHANGES[] = {
      {"/a none", "/a digest wrong", "/cgi-bin/b.cgi?x=%26&y none",
       "/cgi-bin/b.cgi?x=%26&y digest wrong", "/c none", "/c digest wrong"}},
 };
+
+// Failures name the row, not its bytes.
+void PrintTo(const Exchange& row, std::ostream* out) {
+    *out << row.name;
+}
 
 class DigestInteropTest : public ::testing::TestWithParam<Exchange> {};
 

@@ -4,6 +4,7 @@
 
 #include <gtest/gtest.h>
 
+#include <ostream>
 #include <string>
 
 namespace {
@@ -103,6 +104,15 @@ const Vector VECTORS[] = {
      "Basic TXVmYXNhOkNpcmNsZSBPZiBMaWZl"},
 };
 
+// Failures name the row, not its bytes.
+template <typename Row>
+void printRow(const Row& row, std::ostream* out) {
+    *out << row.name;
+}
+void PrintTo(const Vector& row, std::ostream* out) {
+    printRow(row, out);
+}
+
 class WendrelAuthVectorTest : public ::testing::TestWithParam<Vector> {};
 
 TEST_P(WendrelAuthVectorTest, AnswersAsTheReferenceDoes) {
@@ -182,6 +192,10 @@ const Choice CHOICES[] = {
     {"HugeField", "Digest nonce=a, " + repeated("parameter%d=\"xxxxxxxx\"", 10000), ""},
 };
 
+void PrintTo(const Choice& row, std::ostream* out) {
+    printRow(row, out);
+}
+
 class WendrelChallengeChoiceTest : public ::testing::TestWithParam<Choice> {};
 
 TEST_P(WendrelChallengeChoiceTest, ChoosesTheFirstSupportedDigestAndRefusesMalformedFields) {
@@ -229,6 +243,10 @@ const Hostile HOSTILE[] = {
     {"RealmWithLineBreak", "Digest nonce=a, realm=\"r\r\nX: y\"", MUFASA, "/", ""},
     {"OpaqueWithNul", bytes("Digest nonce=a, opaque=\"\0\""), MUFASA, "/", ""},
 };
+
+void PrintTo(const Hostile& row, std::ostream* out) {
+    printRow(row, out);
+}
 
 class WendrelAuthHostileTest : public ::testing::TestWithParam<Hostile> {};
 
