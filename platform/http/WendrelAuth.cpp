@@ -3,88 +3,32 @@
 #include <QCryptographicHash>
 #include <QRandomGenerator>
 
-#include <vector>
+#include <openssl/evp.h>
 
 namespace {
 
-// Enough for every camera of a large site; the table starts over when full.
-const qsizetype MAX_KNOWN = 4096;
+using Algorithm = WendrelChallenge::Algorithm;
 
-bool isSpace(char c) {
-    return c == ' ' || c == '\t';
-}
-
-QByteArray readToken(const QByteArray& text, qsizetype& at) {
-    const qsizetype start = at;
-    while (at < text.size() && !isSpace(text[at]) && text[at] != ',' && text[at] != '=')
-        ++at;
-    return text.mid(start, at - start);
-}
-
-QByteArray readValue(const QByteArray& text, qsizetype& at) {
-    if (at >= text.size() || text[at] != '"') {
-        const qsizetype start = at;
-        while (at < text.size() && text[at] != ',' && !isSpace(text[at]))
-            ++at;
-        return text.mid(start, at - start);
+// Lower-case hex of the algorithm's hash; empty when it cannot be computed.
+QByteArray hashHex(Algorithm algorithm, const QByteArray& text) {
+    switch (algorithm) {
+    case Algorithm::Md5:
+        return QCryptographicHash::hash(text, QCryptographicHash::Md5).toHex();
+    case Algorithm::Sha256:
+        return QCryptographicHash::hash(text, QCryptographicHash::Sha256).toHex();
+    case Algorithm::Sha512_256: {
+        // Not SHA-512 cut short: SHA-512/256 starts from its own initial values.
+        unsigned char digest[EVP_MAX_MD_SIZE];
+        unsigned int size = 0;
+        if (EVP_Digest(text.constData(), size_t(text.size()), digest, &size, EVP_sha512_256(),
+                       nullptr) != 1)
+            return {};
+        return QByteArray(reinterpret_cast<const char*>(digest), int(size)).toHex();
     }
-    QByteArray value;
-    for (++at; at < text.size() && text[at] != '"'; ++at) {
-        if (text[at] == '\\' && at + 1 < text.size())
-            ++at;
-        value += text[at];
+    case Algorithm::Unsupported:
+        break;
     }
-    ++at;
-    return value;
-}
-
-// Challenges are a scheme name followed by name=value parameters, all separated by commas.
-std::vector<WendrelAuth::Challenge> parseChallenges(const QByteArray& text) {
-    std::vector<WendrelAuth::Challenge> challenges;
-    qsizetype at = 0;
-    while (at < text.size()) {
-        while (at < text.size() && (isSpace(text[at]) || text[at] == ','))
-            ++at;
-        const QByteArray token = readToken(text, at);
-        if (token.isEmpty()) {
-            ++at;
-            continue;
-        }
-        qsizetype next = at;
-        while (next < text.size() && isSpace(text[next]))
-            ++next;
-        if (next < text.size() && text[next] == '=' && !challenges.empty()) {
-            at = next + 1;
-            while (at < text.size() && isSpace(text[at]))
-                ++at;
-            challenges.back().params.insert(token.toLower(), readValue(text, at));
-        } else {
-            challenges.push_back({token.toLower(), {}});
-        }
-    }
-    return challenges;
-}
-
-bool isSession(const WendrelAuth::Challenge& challenge) {
-    return challenge.params.value("algorithm").compare("MD5-sess", Qt::CaseInsensitive) == 0;
-}
-
-bool usesQopAuth(const WendrelAuth::Challenge& challenge) {
-    for (const QByteArray& qop : challenge.params.value("qop").split(',')) {
-        if (qop.trimmed().compare("auth", Qt::CaseInsensitive) == 0)
-            return true;
-    }
-    return false;
-}
-
-bool canAnswerDigest(const WendrelAuth::Challenge& challenge) {
-    const QByteArray algorithm = challenge.params.value("algorithm", "MD5");
-    return (algorithm.compare("MD5", Qt::CaseInsensitive) == 0 || isSession(challenge)) &&
-           (!challenge.params.contains("qop") || usesQopAuth(challenge));
-}
-
-QByteArray md5Hex(const QByteArray& text) {
-    return QCryptographicHash::hash(text, QCryptographicHash::Md5).toHex();
+    return {};
 }
 
 QByteArray quoted(const QByteArray& value) {
@@ -93,8 +37,70 @@ QByteArray quoted(const QByteArray& value) {
     return '"' + escaped + '"';
 }
 
+// Printable ASCII only: what a quoted string carries as itself.
+bool isQuotable(const QByteArray& text) {
+    for (const char c : text) {
+        if (c < 0x20 || c > 0x7e)
+            return false;
+    }
+    return true;
+}
+
+// The last guard before the wire: no control character, CR, LF and NUL above all.
+bool isSafeHeaderValue(const QByteArray& value) {
+    for (const char c : value) {
+        if (static_cast<unsigned char>(c) < 0x20 || c == 0x7f)
+            return false;
+    }
+    return true;
+}
+
+// RFC 7616, section 3.4.4: username, username* or the user hash.
+QByteArray usernameParameter(const WendrelChallenge& challenge, const QString& user) {
+    const QByteArray bytes = user.toUtf8();
+    if (challenge.userhash)
+        return "username=" + quoted(hashHex(challenge.algorithm, bytes + ':' + challenge.realm));
+    if (isQuotable(bytes))
+        return "username=" + quoted(bytes);
+    // RFC 8187's ext-value: attr-char stays, everything else is percent-encoded.
+    return "username*=UTF-8''" + QUrl::toPercentEncoding(user, "!#$&+^`|");
+}
+
+QByteArray digestAnswer(const WendrelChallenge& challenge, const QByteArray& method,
+                        const QByteArray& target, const QString& user, const QString& password,
+                        const QByteArray& clientNonce, quint32 count) {
+    const Algorithm algorithm = challenge.algorithm;
+    const auto hash = [algorithm](const QByteArray& text) { return hashHex(algorithm, text); };
+    const QByteArray& nonce = challenge.nonce;
+    const QByteArray countText = QByteArray::number(count, 16).rightJustified(8, '0');
+    const bool qopAuth = challenge.qop == WendrelChallenge::Qop::Auth;
+
+    QByteArray secret = hash(user.toUtf8() + ':' + challenge.realm + ':' + password.toUtf8());
+    if (challenge.session)
+        secret = hash(secret + ':' + nonce + ':' + clientNonce);
+    const QByteArray request = hash(method + ':' + target);
+    const QByteArray response =
+        qopAuth
+            ? hash(secret + ':' + nonce + ':' + countText + ':' + clientNonce + ":auth:" + request)
+            : hash(secret + ':' + nonce + ':' + request);
+    if (response.isEmpty())
+        return {};
+
+    QByteArray header = "Digest " + usernameParameter(challenge, user) +
+                        ", realm=" + quoted(challenge.realm) + ", uri=" + quoted(target) +
+                        ", algorithm=" + challenge.algorithmName() + ", nonce=" + quoted(nonce);
+    if (qopAuth)
+        header += ", nc=" + countText + ", cnonce=" + quoted(clientNonce) + ", qop=auth";
+    header += ", response=" + quoted(response);
+    if (challenge.hasOpaque)
+        header += ", opaque=" + quoted(challenge.opaque);
+    if (challenge.userhash)
+        header += ", userhash=true";
+    return header;
+}
+
 QByteArray newClientNonce() {
-    quint32 words[2];
+    quint32 words[4];
     QRandomGenerator::system()->fillRange(words);
     return QByteArray(reinterpret_cast<const char*>(words), sizeof words).toHex();
 }
@@ -104,70 +110,63 @@ QByteArray newClientNonce() {
 QByteArray WendrelAuth::before(const QString& origin, const QByteArray& method,
                                const QByteArray& target, const QString& user,
                                const QString& password) {
-    const auto found = known.find(keyOf(origin, user, password));
-    if (found == known.end())
+    Known* found = known.find(keyOf(origin, user, password));
+    if (!found)
         return {};
     return respond(found->challenge, method, target, user, password, newClientNonce(),
                    ++found->count);
 }
 
-QByteArray WendrelAuth::answer(const QString& origin, const QByteArray& challenges,
-                               const QByteArray& method, const QByteArray& target,
-                               const QString& user, const QString& password) {
-    const Challenge challenge = choose(challenges);
-    if (challenge.scheme.isEmpty())
-        return {};
-    if (known.size() >= MAX_KNOWN)
-        known.clear();
-    known.insert(keyOf(origin, user, password), Known{challenge, 1});
-    return respond(challenge, method, target, user, password, newClientNonce(), 1);
+WendrelAuth::Answer WendrelAuth::answer(const QString& origin, const QByteArray& challenges,
+                                        const QByteArray& method, const QByteArray& target,
+                                        const QString& user, const QString& password, bool https) {
+    const QByteArray key = keyOf(origin, user, password);
+    const std::optional<WendrelChallenge> chosen = WendrelChallenge::choose(challenges);
+    if (!chosen) {
+        known.remove(key);
+        return {{}, Answer::Refusal::Unanswerable, {}};
+    }
+    const bool basic = chosen->scheme == WendrelChallenge::Scheme::Basic;
+    const QByteArray scheme = basic ? "Basic" : "Digest";
+    if (basic && !https && digestWorked.find(key)) {
+        known.remove(key);
+        return {{}, Answer::Refusal::Downgrade, scheme};
+    }
+    const QByteArray authorization =
+        respond(*chosen, method, target, user, password, newClientNonce(), 1);
+    if (authorization.isEmpty()) {
+        known.remove(key);
+        return {{}, Answer::Refusal::Unanswerable, scheme};
+    }
+    known.insert(key, Known{*chosen, 1}, chosen->heapBytes());
+    return {authorization, Answer::Refusal::None, scheme};
+}
+
+void WendrelAuth::accepted(const QString& origin, const QString& user, const QString& password) {
+    const QByteArray key = keyOf(origin, user, password);
+    if (!digestWorked.find(key))
+        digestWorked.insert(key, {}, 0);
+    // A Basic challenge answered while the Digest request was under way: ask again, so that
+    // answer() decides.
+    const Known* found = known.find(key);
+    if (found && found->challenge.scheme == WendrelChallenge::Scheme::Basic)
+        known.remove(key);
 }
 
 void WendrelAuth::forget(const QString& origin, const QString& user, const QString& password) {
     known.remove(keyOf(origin, user, password));
 }
 
-WendrelAuth::Challenge WendrelAuth::choose(const QByteArray& challenges) {
-    const std::vector<Challenge> offered = parseChallenges(challenges);
-    for (const Challenge& challenge : offered) {
-        if (challenge.scheme == "digest" && canAnswerDigest(challenge))
-            return challenge;
-    }
-    for (const Challenge& challenge : offered) {
-        if (challenge.scheme == "basic")
-            return challenge;
-    }
-    return {};
-}
-
-QByteArray WendrelAuth::respond(const Challenge& challenge, const QByteArray& method,
+QByteArray WendrelAuth::respond(const WendrelChallenge& challenge, const QByteArray& method,
                                 const QByteArray& target, const QString& user,
                                 const QString& password, const QByteArray& clientNonce,
                                 quint32 count) {
-    if (challenge.scheme == "basic")
-        return "Basic " + (user.toUtf8() + ':' + password.toUtf8()).toBase64();
-
-    const QByteArray realm = challenge.params.value("realm");
-    const QByteArray nonce = challenge.params.value("nonce");
-    const QByteArray countText = QByteArray::number(count, 16).rightJustified(8, '0');
-    const bool qopAuth = usesQopAuth(challenge);
-    QByteArray secret = md5Hex(user.toUtf8() + ':' + realm + ':' + password.toUtf8());
-    if (isSession(challenge))
-        secret = md5Hex(secret + ':' + nonce + ':' + clientNonce);
-    const QByteArray request = md5Hex(method + ':' + target);
-    const QByteArray response = qopAuth ? md5Hex(secret + ':' + nonce + ':' + countText + ':' +
-                                                 clientNonce + ":auth:" + request)
-                                        : md5Hex(secret + ':' + nonce + ':' + request);
-
-    QByteArray header = "Digest username=" + quoted(user.toUtf8()) + ", realm=" + quoted(realm) +
-                        ", nonce=" + quoted(nonce) + ", uri=" + quoted(target) +
-                        ", response=" + quoted(response) +
-                        ", algorithm=" + challenge.params.value("algorithm", "MD5");
-    if (qopAuth)
-        header += ", qop=auth, nc=" + countText + ", cnonce=" + quoted(clientNonce);
-    if (challenge.params.contains("opaque"))
-        header += ", opaque=" + quoted(challenge.params.value("opaque"));
-    return header;
+    QByteArray header;
+    if (challenge.scheme == WendrelChallenge::Scheme::Basic)
+        header = "Basic " + (user.toUtf8() + ':' + password.toUtf8()).toBase64();
+    else if (challenge.scheme == WendrelChallenge::Scheme::Digest && challenge.answerable())
+        header = digestAnswer(challenge, method, target, user, password, clientNonce, count);
+    return isSafeHeaderValue(header) ? header : QByteArray();
 }
 
 QByteArray WendrelAuth::target(const QUrl& url) {

@@ -1,9 +1,11 @@
 #include "WendrelExchange.h"
 
 #include "WendrelAuth.h"
+#include "WendrelChallenge.h"
 #include "WendrelRequestWriter.h"
 #include "WendrelUrl.h"
 
+#include <optional>
 #include <utility>
 
 namespace {
@@ -47,6 +49,8 @@ WendrelExchange::Next WendrelExchange::next(const WendrelConnection::Outcome& ou
         return {Action::Complete, outcome.failure};
     }
     const WendrelResponseReader::Answer& answer = outcome.answer;
+    if (answer.status != 401 && sentScheme == "Digest")
+        auth.accepted(originKey, current.user, current.password);
     if (answer.status == 401)
         return challenged(outcome, auth);
     if (isRedirect(answer.status) && !answer.location.isEmpty())
@@ -96,7 +100,8 @@ bool WendrelExchange::hasCredentials() const {
     return !current.bearer && !(current.user.isEmpty() && current.password.isEmpty());
 }
 
-// Answers the challenge once, so that rejected credentials end the request.
+// Answers the challenge once, so that rejected credentials end the request; once more when the
+// server only renewed its nonce (RFC 7616, stale=true).
 WendrelExchange::Next WendrelExchange::challenged(const WendrelConnection::Outcome& outcome,
                                                   WendrelAuth& auth) {
     const QByteArray offered = WendrelFailure::peerText(outcome.answer.challenges);
@@ -108,19 +113,31 @@ WendrelExchange::Next WendrelExchange::challenged(const WendrelConnection::Outco
                                   "(the server offers: " +
                                       offered + ')'}};
     if (challengeAnswered) {
-        auth.forget(originKey, current.user, current.password);
+        const std::optional<WendrelChallenge> renewed =
+            WendrelChallenge::choose(outcome.answer.challenges);
+        if (staleAnswered || sentScheme != "Digest" || !renewed || !renewed->stale) {
+            auth.forget(originKey, current.user, current.password);
+            return {Action::Complete,
+                    {QNetworkReply::AuthenticationRequiredError,
+                     "credentials rejected (" + sentScheme + ")"}};
+        }
+        staleAnswered = true;
+    }
+    const WendrelAuth::Answer answered =
+        auth.answer(originKey, outcome.answer.challenges, current.method, target(), current.user,
+                    current.password, WendrelUrl::isHttps(current.url));
+    if (answered.refusal == WendrelAuth::Answer::Refusal::Downgrade)
         return {Action::Complete,
                 {QNetworkReply::AuthenticationRequiredError,
-                 "credentials rejected (" + sentScheme + ")"}};
-    }
-    authorization = auth.answer(originKey, outcome.answer.challenges, current.method, target(),
-                                current.user, current.password);
-    if (authorization.isEmpty())
+                 "credentials rejected: downgrade refused (the server asks for Basic over plain "
+                 "HTTP, where Digest had worked with the same credentials)"}};
+    if (answered.authorization.isEmpty())
         return {Action::Complete,
                 {QNetworkReply::AuthenticationRequiredError,
                  "authentication required, but no challenge can be answered (the server "
                  "offers: " +
                      offered + ')'}};
+    authorization = answered.authorization;
     challengeAnswered = true;
     return {Action::Send, {}};
 }
@@ -150,7 +167,7 @@ WendrelExchange::Next WendrelExchange::redirected(const WendrelConnection::Outco
         current.contentType.clear();
     }
     current.url = next;
-    challengeAnswered = false;
+    challengeAnswered = staleAnswered = false;
     return {Action::Send, {}};
 }
 

@@ -47,6 +47,7 @@ private:
     QByteArray authorization; // answering a challenge, for the next attempt
     QByteArray sentScheme;    // the scheme of the credentials the last attempt carried
     bool challengeAnswered = false;
+    bool staleAnswered = false; // a second answer, to a challenge that only renewed the nonce
     bool resent = false;
     int redirects = 0;
 };

@@ -3,6 +3,7 @@
 
 #include <gtest/gtest.h>
 
+#include <optional>
 #include <string>
 #include <tuple>
 #include <utility>
@@ -36,8 +37,9 @@ TEST(CamsimTest, DigestAcceptsEachIssuedNonceCountOnce) {
     const CamsimProcess::Answer first = camsim.exchange("GET", target);
     ASSERT_EQ(first.status, 401);
     ASSERT_TRUE(first.challenge.contains("qop=\"auth\"")) << first.challenge.data();
-    WendrelAuth::Challenge challenge = WendrelAuth::choose(first.challenge);
-    const QByteArray nonce = challenge.params.value("nonce");
+    std::optional<WendrelChallenge> challenge = WendrelChallenge::choose(first.challenge);
+    ASSERT_TRUE(challenge);
+    const QByteArray nonce = challenge->nonce;
     // Where it goes, the nonce and the nonce count; the answer is always computed for target.
     const std::tuple<QString, QByteArray, quint32> attempts[] = {
         {target, nonce, 1},
@@ -47,8 +49,8 @@ TEST(CamsimTest, DigestAcceptsEachIssuedNonceCountOnce) {
         {QStringLiteral("/cgi-bin/admin/getparam.cgi?camctrl"), nonce, 4}};
     std::vector<std::string> outcomes;
     for (const auto& [path, issued, count] : attempts) {
-        challenge.params["nonce"] = issued;
-        const QByteArray authorization = WendrelAuth::respond(challenge, "GET", target.toLatin1(),
+        challenge->nonce = issued;
+        const QByteArray authorization = WendrelAuth::respond(*challenge, "GET", target.toLatin1(),
                                                               "admin", "admin", "0a4f113b", count);
         const CamsimProcess::Answer answer =
             camsim.exchange("GET", path, {}, {{"Authorization", authorization}});
