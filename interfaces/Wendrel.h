@@ -18,8 +18,11 @@
 // event loop of the thread that created the client.
 //
 // The timeout is a total deadline in milliseconds from the call; 0 means none. Paths and URLs are
-// taken as already percent-encoded. User name and password answer the server's Basic or Digest
-// challenge, once per request, and serve no other request; they never go into the URL or the log.
+// taken as already percent-encoded. User name and password answer the server's Digest (MD5,
+// SHA-256, SHA-512-256, with or without -sess; preferred) or Basic challenge, once per request
+// (twice when the server only renewed its nonce), and serve no other request; they never go into
+// the URL or the log. Once Digest has worked with a server and credentials, Basic is refused for
+// them over plain http, with AuthenticationRequiredError.
 // Headers are "Name: value" strings. A request whose user name or password holds a control
 // character, whose header name is not an HTTP token, or whose header value, content type or
 // bearer token holds CR, LF or NUL is refused without being sent, with
