@@ -252,9 +252,10 @@ void VcaRuleRetriever::VcaRuleRetrieverPrivate::convertJsonRules(const QVariant&
     for (const QVariant& entry : rules) {
         const QVariantMap rule = entry.toMap();
         const QString name = percentDecoded(rule.value(NAME_ATTRIBUTE).toString());
-        // The text is read as the member "v" of a wrapper object, so the name needs no escaping.
+        // The text is read as the member of that name of a wrapper object, the name written as a
+        // JSON string: a quote or a backslash in it keeps the rule.
         const std::optional<QByteArray> value =
-            JsonNormaliser::wrappedValue(rule.value(TEXT).toString().toUtf8());
+            JsonNormaliser::memberValue(name, rule.value(TEXT).toString().toUtf8());
         QMap<QString, QByteArray>& rulesOfType = rulesByType[rule.value(TYPE_ATTRIBUTE).toString()];
         if (value)
             rulesOfType.insert(name, *value);
