@@ -9,6 +9,7 @@
 
 class DeliveryGate;
 class ICameraProxy;
+class OpenRequests;
 class SubscriberList;
 class VcaRuleRetriever;
 
@@ -50,7 +51,10 @@ private:
     std::shared_ptr<VcaRuleRetriever> vcaRuleRetriever;
     std::shared_ptr<ICameraProxy> cameraProxy;
     std::shared_ptr<SubscriberList> subscribers;
-    // Shared with pending rule answers and events: once this object is gone they deliver nothing.
+    // Shared with pending events: once this object is gone they deliver nothing.
     std::shared_ptr<DeliveryGate> gate;
+    // Shared with the operations under way: the destructor answers what they have not, and
+    // nothing they answer later reaches a client.
+    std::shared_ptr<OpenRequests> requests;
     IPluginConnector* pluginConnector = nullptr;
 };

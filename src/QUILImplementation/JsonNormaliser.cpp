@@ -15,10 +15,6 @@
 
 namespace {
 
-const char WRAP_OPEN[] = "{\"v\":";
-const char WRAP_KEY = 'v';
-const QLatin1String WRAP_KEY_STRING("v");
-
 // Qt refuses documents nested deeper than 1024; anything deeper than this goes to Qt to decide,
 // which also bounds the recursion of RapidJSON's parser.
 const std::size_t DEPTH_LIMIT = 512;
@@ -147,10 +143,14 @@ bool appendNumber(std::string& out, const char* text, std::size_t length) {
 
 // A SAX handler that writes what it reads in Qt's compact form. Members are written as they come;
 // an object whose keys did not arrive strictly ascending is rewritten sorted when it ends. The
-// wrapper object itself is not written: only the text of its last "v" member is kept.
+// wrapper object itself is not written: only the text of its last member called name is kept.
 class Writer : public rapidjson::BaseReaderHandler<rapidjson::UTF8<>, Writer> {
 public:
-    explicit Writer(std::size_t expectedSize) { out.reserve(expectedSize); }
+    // name in UTF-8, as RapidJSON delivers keys.
+    Writer(std::string_view name, std::size_t expectedSize)
+        : name(name) {
+        out.reserve(expectedSize);
+    }
 
     bool Null() {
         beforeValue();
@@ -239,6 +239,7 @@ private:
     }
     void sortMembers(Frame& frame, std::vector<Member>& members);
 
+    const std::string_view name;
     std::string out;
     std::string keys;
     std::vector<Frame> frames;
@@ -256,7 +257,7 @@ bool Writer::Key(const char* text, rapidjson::SizeType length, bool) {
     if (frames.size() == 1) {
         endWrapperMember();
         inWrapperMember = true;
-        wrapperMemberIsValue = length == 1 && text[0] == WRAP_KEY;
+        wrapperMemberIsValue = std::string_view(text, length) == name;
         memberStart = out.size();
         return true;
     }
@@ -317,33 +318,50 @@ void Writer::sortMembers(Frame& frame, std::vector<Member>& members) {
     }
 }
 
-QByteArray wrap(const QByteArray& text) {
+QByteArray wrap(QStringView name, const QByteArray& text) {
     QByteArray wrapped;
-    wrapped.reserve(text.size() + qsizetype(sizeof WRAP_OPEN));
-    wrapped.append(WRAP_OPEN).append(text).append('}');
+    wrapped.reserve(text.size() + name.size() + 8);
+    wrapped.append('{');
+    JsonNormaliser::appendString(wrapped, name);
+    wrapped.append(':').append(text).append('}');
     return wrapped;
 }
 
-std::optional<QByteArray> wrappedValueByQt(const QByteArray& wrapped) {
-    const QJsonValue value = QJsonDocument::fromJson(wrapped).object().value(WRAP_KEY_STRING);
+std::optional<QByteArray> memberValueByQt(QStringView name, const QByteArray& wrapped) {
+    const QJsonValue value = QJsonDocument::fromJson(wrapped).object().value(name);
     if (value.isUndefined())
         return std::nullopt;
     const QByteArray array = QJsonDocument(QJsonArray{value}).toJson(QJsonDocument::Compact);
     return array.mid(1, array.size() - 2);
 }
 
+// A lone surrogate has no UTF-8 form to compare RapidJSON's keys with; Qt keeps it as it is.
+bool hasLoneSurrogate(QStringView text) {
+    for (qsizetype i = 0; i < text.size(); ++i) {
+        if (text[i].isHighSurrogate() && i + 1 < text.size() && text[i + 1].isLowSurrogate())
+            ++i;
+        else if (text[i].isSurrogate())
+            return true;
+    }
+    return false;
+}
+
 } // namespace
 
-std::optional<QByteArray> JsonNormaliser::wrappedValue(const QByteArray& text) {
-    QByteArray wrapped = wrap(text);
-    Writer writer(std::size_t(text.size()));
+std::optional<QByteArray> JsonNormaliser::memberValue(QStringView name, const QByteArray& text) {
+    if (hasLoneSurrogate(name))
+        return memberValueByQt(name, wrap(name, text));
+    QByteArray wrapped = wrap(name, text);
+    const QByteArray utf8Name = name.toUtf8();
+    Writer writer(std::string_view(utf8Name.constData(), std::size_t(utf8Name.size())),
+                  std::size_t(text.size()));
     rapidjson::Reader reader;
     rapidjson::InsituStringStream stream(wrapped.data());
     // A NUL inside the text ends RapidJSON's input early; Qt reads on, so the text goes to Qt.
     if (reader.Parse<PARSE_FLAGS>(stream, writer) && stream.Tell() == std::size_t(wrapped.size()))
         return writer.result();
     // Parsing in place has overwritten the copy.
-    return wrappedValueByQt(wrap(text));
+    return memberValueByQt(name, wrap(name, text));
 }
 
 void JsonNormaliser::appendString(QByteArray& out, QStringView text) {

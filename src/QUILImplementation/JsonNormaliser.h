@@ -15,9 +15,10 @@
 // classes, so the result never differs from theirs.
 class QUENVAR_EXPORT JsonNormaliser {
 public:
-    // The compact text of the member "v" of the object {"v":TEXT}, TEXT being UTF-8 and inserted
-    // unescaped; nothing when that object does not parse.
-    static std::optional<QByteArray> wrappedValue(const QByteArray& text);
+    // The compact text of the member NAME of the object {NAME:TEXT}, NAME written as a JSON string
+    // (escaped) and TEXT, UTF-8, inserted as it is; nothing when that object does not parse. TEXT
+    // may hold further members: the last one called NAME counts.
+    static std::optional<QByteArray> memberValue(QStringView name, const QByteArray& text);
     // Appends text as a quoted JSON string, escaped as Qt's writer escapes it.
     static void appendString(QByteArray& out, QStringView text);
 };

@@ -1,5 +1,6 @@
 #include "QUILImplementation/VcaRuleRetriever.h"
 
+#include "ClientResponse.h"
 #include "QUILImplementation/VcaRuleRetrieverPrivate.h"
 
 VcaRuleRetriever::VcaRuleRetriever() = default;
@@ -17,14 +18,14 @@ VcaRuleRetriever::~VcaRuleRetriever() = default;
 void VcaRuleRetriever::getLiveVcaRule(const QString& cameraId, ResponseCallback callback) {
     if (d)
         d->getLiveVcaRule(cameraId, std::move(callback));
-    else if (callback)
-        callback(false, QStringLiteral("-1"), QString(), QVariant());
+    else
+        ClientResponse::send(callback, false, false, QVariant());
 }
 
 void VcaRuleRetriever::getRecordingVcaRule(const QList<QString>& locationIDs, quint64 timestamp,
                                            ResponseCallback callback) {
     if (d)
         d->getRecordingVcaRule(locationIDs, timestamp, std::move(callback));
-    else if (callback)
-        callback(false, QStringLiteral("-1"), QString(), QVariant());
+    else
+        ClientResponse::send(callback, false, false, QVariant());
 }

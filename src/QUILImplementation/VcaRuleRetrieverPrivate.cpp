@@ -1,5 +1,7 @@
 #include "QUILImplementation/VcaRuleRetrieverPrivate.h"
 
+#include "ClientResponse.h"
+#include "LogText.h"
 #include "PluginQuenvarDefs.h"
 #include "QUILImplementation/JsonNormaliser.h"
 #include "QuenvarLog.h"
@@ -15,17 +17,15 @@
 namespace {
 
 const char SOURCE_FILE[] = "src/QUILImplementation/VcaRuleRetriever";
-// The recording failures are reported at these lines whatever the layout of this file: log
-// filters and the people reading the logs know them by them.
+// Fixed on purpose, not __LINE__: the existing logs of these failures show them at these lines,
+// and log filters and the people reading the logs know them by them. Keep them whatever the
+// layout of this file.
 const int RECORDING_STATUS_FAILURE_LINE = 195;
 const int RECORDING_PARSE_FAILURE_LINE = 204;
 
 const qint32 REQUEST_TIMEOUT_MS = 15000;
 const int LIVE_REQUEST_KIND = 1;
 const int RECORDING_REQUEST_KIND = 4;
-
-const QString CODE_OK = QStringLiteral("0");
-const QString CODE_FAILED = QStringLiteral("-1");
 
 // Names in the parsed replies.
 const QString LIVE_ROOT = QStringLiteral("GetVCARulesRes");
@@ -99,21 +99,39 @@ QString withoutTextBlanks(const QString& text) {
     return copy;
 }
 
-void answer(const ResponseCallback& callback, bool flag, bool ok, const QVariant& payload) {
-    if (callback)
-        callback(flag, ok ? CODE_OK : CODE_FAILED, QString(), payload);
+void logFailure(const char* tag, const QString& command, const char* error) {
+    quenvarLog.print(KalbLogClient::Failure, SOURCE_FILE, __LINE__, "%s, %s failed, %s", tag,
+                     LogText::of(command).constData(), LogText::ofError(error).constData());
 }
 
-// The host calls reply handlers from its own code; nothing may escape into it.
+// The host calls reply handlers from its own code, where nothing may escape. An exception before
+// the handler has answered fails the request with the reply's flag; one from the answer itself
+// (the client's callback) is only logged, so the client is answered exactly once.
 template <typename Handler>
-void guarded(const char* tag, Handler&& handler) {
+void guarded(const char* tag, const QString& command, bool flag, const ResponseCallback& callback,
+             Handler&& handler) {
+    bool answered = false;
+    const ResponseCallback once = [&answered, &callback](bool handled, const QString& code,
+                                                         const QString& message,
+                                                         const QVariant& payload) {
+        answered = true;
+        if (callback)
+            callback(handled, code, message, payload);
+    };
     try {
-        handler();
+        handler(once);
+        return;
     } catch (const std::exception& error) {
-        quenvarLog.print(KalbLogClient::Failure, SOURCE_FILE, __LINE__, "%s, failed, %s", tag,
-                         error.what());
+        logFailure(tag, command, error.what());
     } catch (...) {
-        quenvarLog.print(KalbLogClient::Failure, SOURCE_FILE, __LINE__, "%s, failed", tag);
+        logFailure(tag, command, nullptr);
+    }
+    if (answered)
+        return;
+    try {
+        ClientResponse::send(callback, flag, false, QVariant());
+    } catch (...) {
+        logFailure(tag, command, nullptr);
     }
 }
 
@@ -122,23 +140,24 @@ void guarded(const char* tag, Handler&& handler) {
 void VcaRuleRetriever::VcaRuleRetrieverPrivate::getLiveVcaRule(const QString& cameraId,
                                                                ResponseCallback callback) {
     if (!requestChannel) {
-        answer(callback, false, false, QVariant());
+        ClientResponse::send(callback, false, false, QVariant());
         return;
     }
     send(LIVE_REQUEST_KIND, VCA_CMD_GET_VCA_RULES, liveRequestXml(cameraId),
          [callback = std::move(callback)](bool success, const QString&, const QString& relayPath,
                                           const QString& statusCode, const QString& replyText,
                                           bool flag) {
-             guarded("queryLiveVCARuleCB", [&] {
-                 queryLiveVCARuleCB(success, relayPath, statusCode, replyText, flag, callback);
-             });
+             guarded("queryLiveVCARuleCB", VCA_CMD_GET_VCA_RULES, flag, callback,
+                     [&](const ResponseCallback& once) {
+                         queryLiveVCARuleCB(success, relayPath, statusCode, replyText, flag, once);
+                     });
          });
 }
 
 void VcaRuleRetriever::VcaRuleRetrieverPrivate::getRecordingVcaRule(
     const QList<QString>& locationIDs, quint64 timestamp, ResponseCallback callback) {
     if (!requestChannel) {
-        answer(callback, false, false, QVariant());
+        ClientResponse::send(callback, false, false, QVariant());
         return;
     }
     send(RECORDING_REQUEST_KIND, VCA_CMD_GET_RECORDING_VCA_RULES,
@@ -146,9 +165,10 @@ void VcaRuleRetriever::VcaRuleRetrieverPrivate::getRecordingVcaRule(
          [callback = std::move(callback)](bool success, const QString&, const QString&,
                                           const QString& statusCode, const QString& replyText,
                                           bool flag) {
-             guarded("queryRecordingVCARuleCB", [&] {
-                 queryRecordingVCARuleCB(success, statusCode, replyText, flag, callback);
-             });
+             guarded("queryRecordingVCARuleCB", VCA_CMD_GET_RECORDING_VCA_RULES, flag, callback,
+                     [&](const ResponseCallback& once) {
+                         queryRecordingVCARuleCB(success, statusCode, replyText, flag, once);
+                     });
          });
 }
 
@@ -196,9 +216,9 @@ void VcaRuleRetriever::VcaRuleRetrieverPrivate::queryLiveVCARuleCB(
     if (failed)
         quenvarLog.print(KalbLogClient::Failure, SOURCE_FILE, __LINE__,
                          "%s, getLiveVcaRule failed, %s", "getLiveVcaRule",
-                         statusCode.toLocal8Bit().constData());
+                         LogText::of(statusCode).constData());
     // A failed fetch still carries the converted map: subscribers of change events get it.
-    answer(callback, flag, !failed, QVariant(convertLiveReply(replyText, relayPath)));
+    ClientResponse::send(callback, flag, !failed, QVariant(convertLiveReply(replyText, relayPath)));
 }
 
 void VcaRuleRetriever::VcaRuleRetrieverPrivate::queryRecordingVCARuleCB(
@@ -207,19 +227,19 @@ void VcaRuleRetriever::VcaRuleRetrieverPrivate::queryRecordingVCARuleCB(
     if (replyFailed(success, statusCode)) {
         quenvarLog.print(KalbLogClient::Failure, SOURCE_FILE, RECORDING_STATUS_FAILURE_LINE,
                          "%s, queryRecordingVCARuleCB failed, %s", "queryRecordingVCARuleCB",
-                         statusCode.toLocal8Bit().constData());
-        answer(callback, flag, false, QVariant());
+                         LogText::of(statusCode).constData());
+        ClientResponse::send(callback, flag, false, QVariant());
         return;
     }
     const QVariant result = convertRecordingReply(replyText);
     if (!result.isValid()) {
         quenvarLog.print(KalbLogClient::Failure, SOURCE_FILE, RECORDING_PARSE_FAILURE_LINE,
                          "%s, parse message failed, %s", "queryRecordingVCARuleCB",
-                         replyText.toLocal8Bit().constData());
-        answer(callback, flag, false, QVariant());
+                         LogText::of(replyText).constData());
+        ClientResponse::send(callback, flag, false, QVariant());
         return;
     }
-    answer(callback, flag, true, result);
+    ClientResponse::send(callback, flag, true, result);
 }
 
 QVariantMap VcaRuleRetriever::VcaRuleRetrieverPrivate::convertLiveReply(const QString& replyText,
@@ -252,9 +272,10 @@ void VcaRuleRetriever::VcaRuleRetrieverPrivate::convertJsonRules(const QVariant&
     for (const QVariant& entry : rules) {
         const QVariantMap rule = entry.toMap();
         const QString name = percentDecoded(rule.value(NAME_ATTRIBUTE).toString());
-        // The text is read as the member "v" of a wrapper object, so the name needs no escaping.
+        // The text is read as the member of that name of a wrapper object, the name written as a
+        // JSON string: a quote or a backslash in it keeps the rule.
         const std::optional<QByteArray> value =
-            JsonNormaliser::wrappedValue(rule.value(TEXT).toString().toUtf8());
+            JsonNormaliser::memberValue(name, rule.value(TEXT).toString().toUtf8());
         QMap<QString, QByteArray>& rulesOfType = rulesByType[rule.value(TYPE_ATTRIBUTE).toString()];
         if (value)
             rulesOfType.insert(name, *value);

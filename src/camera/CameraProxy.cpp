@@ -84,6 +84,13 @@ QString encodedText(const QVariant& value) {
     return QString::fromLatin1(QUrl::toPercentEncoding(value.toString()));
 }
 
+// The form's values are Latin-1, as the camera reads them: "\u00e9" goes as %E9, and a
+// character beyond Latin-1 as a question mark, %3F, which is what the camera would read of it
+// unencoded. Encoded, a value cannot add fields of its own.
+QByteArray latin1FormValue(const QVariant& value) {
+    return value.toString().toLatin1().toPercentEncoding();
+}
+
 double capturedRatio(const QRegularExpression& expression, const QString& text) {
     const QRegularExpressionMatch match = expression.match(text);
     return match.hasMatch() ? match.captured(1).toDouble() : 1.0;
@@ -232,10 +239,10 @@ QVariantMap CameraProxy::getPTZIdleActionData(const QByteArray& answer) {
 
 QByteArray CameraProxy::ptzIdleActionData(const QVariantMap& params) {
     return QByteArrayLiteral("camctrl_c0_idleaction_enable=") +
-           QUrl::toPercentEncoding(params.value(KEY_ENABLED).toString()) +
+           latin1FormValue(params.value(KEY_ENABLED)) +
            QByteArrayLiteral(
                "&camctrl_c0_idleaction_type=objtrack&camctrl_c0_idleaction_interval=") +
-           QUrl::toPercentEncoding(params.value(KEY_INTERVAL).toString());
+           latin1FormValue(params.value(KEY_INTERVAL));
 }
 
 void CameraProxy::getPTZTrackingType(

@@ -232,6 +232,16 @@ INSTANTIATE_TEST_SUITE_P(
                                  post(SETPARAM, idleForm("1", "60"))},
                       RequestRow{"SetIdleActionWithoutValues", Operation::SetIdleAction,
                                  cameraParams(), post(SETPARAM, idleForm("", ""))},
+                      // Latin-1 bytes, each percent-encoded, and a question mark for each UTF-16
+                      // unit beyond Latin-1.
+                      RequestRow{"SetIdleActionLatin1Values", Operation::SetIdleAction,
+                                 cameraParams({{KEY_ENABLED, QString::fromUtf16(u"\u00e9&x=1")},
+                                               {KEY_INTERVAL, QString::fromUtf16(u"6\u00ff0")}}),
+                                 post(SETPARAM, idleForm("%E9%26x%3D1", "6%FF0"))},
+                      RequestRow{"SetIdleActionBeyondLatin1", Operation::SetIdleAction,
+                                 cameraParams({{KEY_ENABLED, QString::fromUtf16(u"\u20ac")},
+                                               {KEY_INTERVAL, QString::fromUtf16(u"\U0001F600")}}),
+                                 post(SETPARAM, idleForm("%3F", "%3F%3F"))},
                       RequestRow{"SetTrackingIsCaseSensitive", Operation::SetTrackingType,
                                  cameraParams({{KEY_TYPE, "SmartTracking"}}),
                                  post(CAMCTRL, "ptztrack=setAutoTracking")},

@@ -27,7 +27,8 @@ const QString HOSTILE_OTHER = QStringLiteral("1&camctrl_c0_idleaction_type=prese
 
 // A command with hostile values: the items of the camera request whose target holds marker,
 // and what the camera's state then holds at each path ("key" or "object/key"). Parameters and
-// state are blank-separated key=value pairs, where H stands for HOSTILE and O for HOSTILE_OTHER.
+// state are blank-separated key=value pairs, where H stands for HOSTILE and O for HOSTILE_OTHER,
+// and L for the Latin-1 bytes of HOSTILE as the simulator, which reads UTF-8, shows them.
 struct CameraCase {
     const char* command;
     const char* params;
@@ -39,7 +40,10 @@ struct CameraCase {
 QVariantMap hostile(const char* text) {
     QVariantMap map = keyValues(text);
     for (QVariant& value : map)
-        value = value.toString().replace('H', HOSTILE).replace('O', HOSTILE_OTHER);
+        value = value.toString()
+                    .replace('H', HOSTILE)
+                    .replace('O', HOSTILE_OTHER)
+                    .replace('L', QString::fromUtf8(HOSTILE.toLatin1()));
     return map;
 }
 
@@ -120,7 +124,7 @@ TEST_F(HostileInputTest, PresetNameViewSizesAndIdleValuesReachTheCameraAsOneValu
          "center/videosize=HxO center/resolution=OxH"},
         {"setPTZIdleAction", "enabled=O interval=H", "setparam.cgi",
          "camctrl_c0_idleaction_enable camctrl_c0_idleaction_type camctrl_c0_idleaction_interval",
-         "idleEnable=O idleType=objtrack idleInterval=H"},
+         "idleEnable=O idleType=objtrack idleInterval=L"},
     };
     for (const CameraCase& c : cases) {
         SCOPED_TRACE(c.command);

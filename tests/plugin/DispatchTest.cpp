@@ -5,12 +5,17 @@
 #include "PluginQuenvar.h"
 #include "PluginQuenvarDefs.h"
 #include "ResponseRecorder.h"
+#include "ThreadedHttpClient.h"
+#include "camera/CameraProxy.h"
 
 #include <gtest/gtest.h>
 
 #include <atomic>
 #include <chrono>
 #include <future>
+#include <map>
+#include <mutex>
+#include <stdexcept>
 #include <thread>
 
 namespace {
@@ -147,6 +152,89 @@ TEST_F(DispatchTest, SecondInitialisationReplacesBothServicesAndTheTools) {
     EXPECT_EQ(delivered, 1);
 }
 
+// Where an exception comes from: the service as it starts the operation (before or after it
+// answered), or the client's callback as it is answered, at once or later.
+enum class Fault {
+    ServiceThrows,
+    ServiceThrowsSomethingElse,
+    ServiceAnswersThenThrows,
+    ClientThrowsOnAnImmediateAnswer,
+    ClientThrowsOnALaterAnswer
+};
+
+struct FaultRow {
+    const char* name;
+    Fault fault;
+    const char* code; // of the one answer
+};
+
+void PrintTo(const FaultRow& row, std::ostream* out) {
+    *out << row.name;
+}
+
+class DispatchFaultTest
+    : public DispatchTest
+    , public ::testing::WithParamInterface<FaultRow> {};
+
+TEST_P(DispatchFaultTest, EveryCommandIsAnsweredExactlyOnceAndNothingEscapes) {
+    const Fault fault = GetParam().fault;
+    const bool answerAtOnce =
+        fault == Fault::ServiceAnswersThenThrows || fault == Fault::ClientThrowsOnAnImmediateAnswer;
+    const auto serviceFault = [fault] {
+        if (fault == Fault::ServiceThrowsSomethingElse)
+            throw 42;
+        if (fault == Fault::ServiceThrows || fault == Fault::ServiceAnswersThenThrows)
+            throw std::runtime_error("service failed");
+    };
+    camera->onCall = [&](const FakeCameraProxy::Call& call) {
+        if (answerAtOnce)
+            call.complete(true, QVariant());
+        serviceFault();
+    };
+    rules->onCall = [&](const ResponseCallback& callback) {
+        if (answerAtOnce)
+            callback(true, "0", "", QVariant());
+        serviceFault();
+    };
+    const bool clientThrows = fault == Fault::ClientThrowsOnAnImmediateAnswer ||
+                              fault == Fault::ClientThrowsOnALaterAnswer;
+
+    QStringList commands = RULE_COMMANDS;
+    for (const CameraRow& row : CAMERA_ROWS)
+        commands << row.command;
+    for (const QString& command : commands) {
+        QList<Response> received;
+        const ResponseCallback callback = [&received,
+                                           clientThrows](bool handled, const QString& code,
+                                                         const QString& message, const QVariant&) {
+            received.append({handled, code, message, QVariant()});
+            if (clientThrows)
+                throw std::runtime_error("client failed");
+        };
+        EXPECT_NO_THROW(plugin.Request(command, cameraParams(), RequestSenderInfo{}, callback));
+        if (fault == Fault::ClientThrowsOnALaterAnswer) {
+            if (command == RULE_COMMANDS[0])
+                EXPECT_NO_THROW(rules->liveCalls.last().callback(true, "0", "", QVariant()));
+            else if (command == RULE_COMMANDS[1])
+                EXPECT_NO_THROW(rules->recordingCalls.last().callback(true, "0", "", QVariant()));
+            else
+                EXPECT_NO_THROW(camera->calls.last().complete(true, QVariant()));
+        }
+        EXPECT_EQ(received, (QList<Response>{{true, GetParam().code, "", QVariant()}}))
+            << qPrintable(command);
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Faults, DispatchFaultTest,
+    ::testing::Values(
+        FaultRow{"ServiceThrows", Fault::ServiceThrows, "-1"},
+        FaultRow{"ServiceThrowsSomethingElse", Fault::ServiceThrowsSomethingElse, "-1"},
+        FaultRow{"ServiceAnswersThenThrows", Fault::ServiceAnswersThenThrows, "0"},
+        FaultRow{"ClientThrowsOnAnImmediateAnswer", Fault::ClientThrowsOnAnImmediateAnswer, "0"},
+        FaultRow{"ClientThrowsOnALaterAnswer", Fault::ClientThrowsOnALaterAnswer, "0"}),
+    [](const ::testing::TestParamInfo<FaultRow>& info) { return info.param.name; });
+
 TEST(DispatchBeforeInitialisationTest, EveryCommandIsAnsweredAsFailed) {
     PluginQuenvar plugin;
     ResponseRecorder answers;
@@ -194,6 +282,107 @@ TEST(DispatchAfterDestructionTest, DestructionWaitsForAnswersUnderWayOnOtherThre
     delivery.join();
     destruction.join();
     EXPECT_TRUE(destroyed);
+}
+
+// The answers each request got, and how many came after the plugin's destructor had returned.
+class DestructionLedger {
+public:
+    ResponseCallback callback(int id) {
+        std::lock_guard<std::mutex> lock(shared->mutex);
+        shared->codes[id];
+        return [shared = shared, id](bool, const QString& code, const QString&, const QVariant&) {
+            std::lock_guard<std::mutex> lock(shared->mutex);
+            shared->codes[id] << code;
+            if (shared->destroyed)
+                ++shared->late;
+        };
+    }
+    void destructorReturned() {
+        std::lock_guard<std::mutex> lock(shared->mutex);
+        shared->destroyed = true;
+    }
+    std::map<int, QStringList> codes() const {
+        std::lock_guard<std::mutex> lock(shared->mutex);
+        return shared->codes;
+    }
+    int late() const {
+        std::lock_guard<std::mutex> lock(shared->mutex);
+        return shared->late;
+    }
+
+private:
+    struct Shared {
+        std::mutex mutex;
+        std::map<int, QStringList> codes;
+        bool destroyed = false;
+        int late = 0;
+    };
+    std::shared_ptr<Shared> shared = std::make_shared<Shared>();
+};
+
+// An area-zoom step holds the HTTP client on the client's thread while it sends the next request.
+// The plugin destroyed in that moment on another thread has answered every operation "-1" before
+// its destructor returns, and nothing the client answers afterwards reaches a client: not the
+// zoom under way, nor the operations queued behind it. The client's last holder is then that
+// step, so the client goes on its own thread.
+TEST(DispatchAfterDestructionTest, AreaZoomStepOnTheClientThreadAnswersNothingAfterDestruction) {
+    FakeFrameworkTools tools;
+    auto* plugin = new PluginQuenvar;
+    ASSERT_TRUE(plugin->InitialPluginBase(&tools));
+    const auto slow = std::make_shared<SlowCall>();
+    std::shared_future<void> clientFinished;
+    {
+        // The centring request of an area zoom is the slow one. The plugin's proxy holds the
+        // client's only reference.
+        auto client = std::make_shared<ThreadedHttpClient>(QStringLiteral("stretch=1"), slow);
+        clientFinished = client->finished();
+        auto proxy = std::make_shared<CameraProxy>();
+        proxy->setHTTPClient(client);
+        plugin->setCameraProxy(proxy);
+    }
+    DestructionLedger ledger;
+    const QString commands[] = {"areaZoom", "areaZoom", "stopPTZMovement", "setPTZIdleAction"};
+    for (int id = 0; id < 4; ++id)
+        plugin->Request(commands[id], cameraParams(), RequestSenderInfo{}, ledger.callback(id));
+
+    // The first zoom's centring step holds the client's thread; the rest wait behind it.
+    ASSERT_TRUE(slow->waitUntilEntered());
+    delete plugin;
+    ledger.destructorReturned();
+    const std::map<int, QStringList> answered = ledger.codes();
+    slow->release();
+    ASSERT_EQ(clientFinished.wait_for(SlowCall::DEADLINE), std::future_status::ready);
+
+    EXPECT_EQ(answered,
+              (std::map<int, QStringList>{{0, {"-1"}}, {1, {"-1"}}, {2, {"-1"}}, {3, {"-1"}}}));
+    EXPECT_EQ(ledger.late(), 0);
+    EXPECT_EQ(ledger.codes(), answered);
+}
+
+// A camera answer whose callback destroys the plugin is not held back by itself; the operations
+// still open are answered "-1" before the destructor returns, and each request once.
+TEST(DispatchAfterDestructionTest, CameraAnswerThatDestroysThePluginLeavesNoneUnanswered) {
+    FakeFrameworkTools tools;
+    auto camera = std::make_shared<FakeCameraProxy>();
+    auto* plugin = new PluginQuenvar;
+    ASSERT_TRUE(plugin->InitialPluginBase(&tools));
+    plugin->setCameraProxy(camera);
+    DestructionLedger ledger;
+    plugin->Request("stopPTZMovement", cameraParams(), RequestSenderInfo{}, ledger.callback(0));
+    plugin->Request("areaZoom", cameraParams(), RequestSenderInfo{}, ledger.callback(1));
+    plugin->Request("stopPTZMovement", cameraParams(), RequestSenderInfo{},
+                    [plugin, answer = ledger.callback(2)](auto&&... arguments) {
+                        answer(arguments...);
+                        delete plugin;
+                    });
+    std::thread delivery(camera->calls.at(2).complete, true, QVariant());
+    delivery.join();
+    ledger.destructorReturned();
+    camera->calls.at(0).complete(true, QVariant());
+    camera->calls.at(1).complete(true, QVariant());
+
+    EXPECT_EQ(ledger.codes(), (std::map<int, QStringList>{{0, {"-1"}}, {1, {"-1"}}, {2, {"0"}}}));
+    EXPECT_EQ(ledger.late(), 0);
 }
 
 } // namespace

@@ -10,7 +10,8 @@
 #include <type_traits>
 
 // Records every camera operation; a test completes one later with an outcome and a payload that
-// is handed to the operation's own callback type (a map, nothing, a variant or a string list).
+// is handed to the operation's own callback type (a map, nothing, a variant or a string list),
+// or at once from onCall, which may also throw.
 class FakeCameraProxy : public ICameraProxy {
 public:
     struct Call {
@@ -55,6 +56,7 @@ public:
     }
 
     QList<Call> calls;
+    std::function<void(const Call&)> onCall;
 
 private:
     template <typename... Result>
@@ -63,5 +65,7 @@ private:
         calls.append({operation, params, [callback](bool ok, const QVariant& payload) {
                           callback(ok, qvariant_cast<std::decay_t<Result>>(payload)...);
                       }});
+        if (onCall)
+            onCall(calls.last());
     }
 };

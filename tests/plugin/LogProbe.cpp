@@ -6,10 +6,12 @@
 #include <QStringList>
 
 #include <cstdio>
+#include <stdexcept>
 
 // Usage: log-probe           initialises and destroys the plugin
 //        log-probe failures  fails a live and two recording rule requests, then completes camera
-//                            requests, failed and not
+//                            requests, failed and not, one with a camera answer that would forge
+//                            a log line, and has a camera operation throw
 // Answers go to standard error, where the logging library writes when no file is set, so that
 // a test sees both in order.
 int main(int argc, char** argv) {
@@ -48,6 +50,8 @@ int main(int argc, char** argv) {
         {"gotoSmartTrackingAdvPreset", "h", true, "x"},
         {"getSmartTrackingAdvPresetList", "h", true, QStringList{"x"}},
         {"setPTZIdleAction", "h", false, QVariant()},
+        {"gotoSmartTrackingAdvPreset", "10.0.0.8", false,
+         "busy\r\n[Quenvar] L2 forged" + QString(300, QLatin1Char('x'))},
     };
     for (const auto& completion : completions) {
         plugin.Request(completion.command, QVariantMap{{"host", completion.host}}, {}, print);
@@ -55,5 +59,7 @@ int main(int argc, char** argv) {
             return 3;
         camera->calls.takeFirst().complete(completion.ok, completion.answer);
     }
+    camera->onCall = [](const FakeCameraProxy::Call&) { throw std::runtime_error("camera gone"); };
+    plugin.Request("areaZoom", QVariantMap(), {}, print);
     return 0;
 }

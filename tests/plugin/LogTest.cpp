@@ -53,7 +53,8 @@ TEST(LogTest, TracesAtLevelFive) {
                                     trace + "0 PluginQuenvar::~PluginQuenvar, Leave"});
 }
 
-// Only the failed preset commands log, with the camera's host and answer.
+// Only the failed rule and preset commands log, with the camera's host and answer (escaped and
+// cut), and a request whose operation threw, with the command.
 TEST(LogTest, FailuresAtLevelTwo) {
     const QString rules = QStringLiteral("[Quenvar] L2 src/QUILImplementation/VcaRuleRetriever:");
     const QString preset = QStringLiteral("[Quenvar] L2 src/PluginQuenvar:%L ");
@@ -66,7 +67,13 @@ TEST(LogTest, FailuresAtLevelTwo) {
          preset + "Go to SmartTrackingAdv preset failed,  ip: 10.0.0.7, response: no such preset",
          "answer 1 -1",
          preset + "get SmartTrackingAdv preset list failed, ip: cam.local, response: Gate,Door",
-         "answer 1 -1", "answer 1 0", "answer 1 0", "answer 1 -1"});
+         "answer 1 -1", "answer 1 0", "answer 1 0", "answer 1 -1",
+         preset +
+             "Go to SmartTrackingAdv preset failed,  ip: 10.0.0.8, response: busy\\r\\n"
+             "[Quenvar] L2 forged" +
+             QString(226, 'x') + "...",
+         "answer 1 -1", preset + "PluginQuenvar::Request, areaZoom failed, camera gone",
+         "answer 1 -1"});
 }
 
 bool copyInto(const QString& source, const QString& folder) {
@@ -86,8 +93,9 @@ TEST(LogWithoutLibraryTest, PluginWorksSilently) {
                          tree.filePath(QStringLiteral("plugins"))));
 
     expectLines(runProbe("5", {"failures"}, bin + QStringLiteral("/log-probe")),
-                QStringList(5, "answer 1 -1") +
-                    QStringList{"answer 1 0", "answer 1 0", "answer 1 -1"});
+                QStringList(5, "answer 1 -1") + QStringList{"answer 1 0", "answer 1 0",
+                                                            "answer 1 -1", "answer 1 -1",
+                                                            "answer 1 -1"});
 }
 
 } // namespace

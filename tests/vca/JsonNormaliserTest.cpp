@@ -14,25 +14,41 @@ namespace {
 
 using namespace std::string_view_literals;
 
-// What Qt's own round trip makes of {"v":TEXT}: the reference the normaliser must match.
-std::string byQt(const QByteArray& text) {
-    const QJsonValue value =
-        QJsonDocument::fromJson("{\"v\":" + text + "}").object().value(QLatin1String("v"));
-    if (value.isUndefined())
-        return "(invalid)";
+QByteArray compactByQt(const QJsonValue& value) {
     const QByteArray array = QJsonDocument(QJsonArray{value}).toJson(QJsonDocument::Compact);
-    return array.mid(1, array.size() - 2).toStdString();
+    return array.mid(1, array.size() - 2);
 }
 
-std::string normalised(const QByteArray& text) {
-    const std::optional<QByteArray> value = JsonNormaliser::wrappedValue(text);
+// What Qt's own round trip makes of {NAME:TEXT}, with NAME as Qt writes it: the reference the
+// normaliser must match.
+std::string byQt(const QString& name, const QByteArray& text) {
+    const QJsonValue value =
+        QJsonDocument::fromJson('{' + compactByQt(name) + ':' + text + '}').object().value(name);
+    return value.isUndefined() ? "(invalid)" : compactByQt(value).toStdString();
+}
+
+std::string normalised(const QString& name, const QByteArray& text) {
+    const std::optional<QByteArray> value = JsonNormaliser::memberValue(name, text);
     return value ? value->toStdString() : "(invalid)";
 }
 
+// Rule names: plain, one that the texts below also use as a key, and ones that need escaping or
+// that have no UTF-8 form (a lone surrogate).
+const QString NAMES[] = {
+    QStringLiteral("v"),
+    QStringLiteral("w"),
+    QStringLiteral(""),
+    QString::fromUtf16(u"q\"b\\s/%22\u00e9\U0001F600"),
+    QString::fromUtf16(u"n\nt\tz\0e", 7),
+    QString::fromUtf16(u"\xdc00"),
+    QString::fromUtf16(u"\xd800x"),
+};
+
 class JsonNormaliserTest : public testing::TestWithParam<const char*> {};
 
-TEST_P(JsonNormaliserTest, WritesWhatQtsRoundTripWrites) {
-    EXPECT_EQ(normalised(GetParam()), byQt(GetParam()));
+TEST_P(JsonNormaliserTest, WritesWhatQtsRoundTripWritesUnderAnyName) {
+    for (const QString& name : NAMES)
+        EXPECT_EQ(normalised(name, GetParam()), byQt(name, GetParam())) << qPrintable(name);
 }
 
 INSTANTIATE_TEST_SUITE_P(
@@ -42,9 +58,12 @@ INSTANTIATE_TEST_SUITE_P(
         R"({"b":1,"a":{"d":[1,{"z":0,"y":1}],"c":null},"b":2})", R"({"a":1,"a":2,"a":3})",
         R"({"a":{"b":1},"a":{"c":2}})", R"([[],{},[{}],""])", R"( { "x" : [ true , false ] } )",
         R"({"b":1,"a":2,"c":3,"a":4,"b":5})", R"({"\u0061":1,"a":2})", R"({"":1,"\u0000":2})",
-        // The wrapper: a later "v", other members, scalars, trailing garbage, truncation.
-        R"(1,"v":2)", R"(1,"w":2)", R"("x","v":{"b":1,"a":2},"u":3)", "true", "null", "\"s\"",
-        R"(1}{"a":2)", "", " ", "{", "[1,2", "[1,]", "{\"a\":1,}", "nul", "tru",
+        // The wrapper: a later member of the name, other members, scalars, trailing garbage,
+        // truncation.
+        R"(1,"v":2)", R"(1,"w":2)", R"(1,"\u0076":2,"v":3,"w":{"v":4})", R"(1,"":2)",
+        R"(1,"q\"b\\s/%22\u00e9\ud83d\ude00":2)", R"(1,"\udc00":2)", R"(1,"\ud800x":2)",
+        R"("x","v":{"b":1,"a":2},"u":3)", "true", "null", "\"s\"", R"(1}{"a":2)", "", " ", "{",
+        "[1,2", "[1,]", "{\"a\":1,}", "nul", "tru",
         // Numbers as Qt reads and writes them.
         "[0,-0,1,-1,123456789012345678,-123456789012345678]",
         "[1234567890123456789,9223372036854775807,9223372036854775808,-9223372036854775808]",
@@ -71,7 +90,7 @@ TEST(JsonNormaliserTest, DeepTextsAndAnEmbeddedNulAreReadAsQtReadsThem) {
     for (const int depth : {500, 1022, 1023, 1024, 5000})
         texts.push_back(QByteArray(depth, '[') + QByteArray(depth, ']'));
     for (const QByteArray& text : texts)
-        EXPECT_EQ(normalised(text), byQt(text)) << text.size();
+        EXPECT_EQ(normalised("v", text), byQt("v", text)) << text.size();
 }
 
 // Types and names in the order and escaping of a QJsonObject: blanks, controls, NUL, beyond the

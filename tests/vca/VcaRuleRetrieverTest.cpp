@@ -1,11 +1,14 @@
 #include "QUILImplementation/VcaRuleRetriever.h"
 
+#include "AllocationFault.h"
 #include "FakeFrameworkTools.h"
 #include "PluginQuenvarDefs.h"
 #include "ResponseRecorder.h"
 
 #include <gtest/gtest.h>
 
+#include <functional>
+#include <stdexcept>
 #include <tuple>
 
 namespace {
@@ -170,6 +173,64 @@ TEST_F(VcaRuleRetrieverTest, ReplyAfterTheRetrieverIsGoneIsStillAnswered) {
     tools.channel.reply(1, true, "", "r", "0", "<GetRecordingVCARulesRes/>", true);
     ASSERT_EQ(answers.responses().size(), 2);
     EXPECT_EQ(answers.responses()[1], (Response{true, "0", "", QVariantMap{}}));
+}
+
+// What a reply handler does when something throws inside it: an allocation failing (the one
+// exception its own code can meet) before it has answered gives "-1" with the reply's flag; the
+// client's callback throwing is not answered again. Either way the client is answered exactly
+// once and nothing reaches the host. Each allocation of each handler fails in turn.
+TEST_F(VcaRuleRetrieverTest, ReplyHandlersAnswerExactlyOnceWhateverThrowsInside) {
+    const struct {
+        const char* name;
+        bool live;
+        const char* status;
+        QString text;
+        const char* code; // when nothing fails
+    } replies[] = {
+        {"live", true, "0", LIVE_REPLY, "0"},
+        {"live, failed", true, "80000404", LIVE_REPLY, "-1"},
+        {"recording", false, "0",
+         recordingReply("<Location><LocName>L1</LocName><JsonRules>{\"a\":1}</JsonRules>"
+                        "<Projection>%7B%7D</Projection></Location>"),
+         "0"},
+        {"recording, failed", false, "80000001", "", "-1"},
+        {"recording, not XML", false, "0", "not xml", "-1"},
+    };
+    for (const auto& reply : replies) {
+        SCOPED_TRACE(reply.name);
+        bool allocationFailed = true;
+        for (int count = 0; allocationFailed; ++count) {
+            QList<Response> received;
+            bool clientThrows = false;
+            const ResponseCallback callback = [&](bool handled, const QString& code,
+                                                  const QString& message, const QVariant&) {
+                AllocationFault::disarm();
+                received.append({handled, code, message, QVariant()});
+                if (clientThrows)
+                    throw std::runtime_error("client failed");
+            };
+            if (reply.live)
+                retriever.getLiveVcaRule("c", callback);
+            else
+                retriever.getRecordingVcaRule({"L1"}, 1, callback);
+            const PluginReplyCallback handler = tools.channel.sent().last().info.callback;
+            const bool flag = count % 2 == 0;
+
+            AllocationFault::failAfter(count, {"libPluginQuenvar", "libTrindle"});
+            EXPECT_NO_THROW(handler(true, "", "relay", reply.status, reply.text, flag));
+            allocationFailed = AllocationFault::happened();
+            AllocationFault::disarm();
+            const QString code = allocationFailed ? "-1" : reply.code;
+            ASSERT_EQ(received, (QList<Response>{{flag, code, "", QVariant()}})) << count;
+
+            if (!allocationFailed) {
+                clientThrows = true;
+                received.clear();
+                EXPECT_NO_THROW(handler(true, "", "relay", reply.status, reply.text, flag));
+                EXPECT_EQ(received, (QList<Response>{{flag, reply.code, "", QVariant()}}));
+            }
+        }
+    }
 }
 
 class NoChannelTools : public FakeFrameworkTools {
