@@ -3,6 +3,8 @@
 #include <QCommandLineParser>
 #include <QRegularExpression>
 
+#include <arpa/inet.h>
+
 namespace {
 
 bool parseListen(const QString& text, QString* host, quint16* port) {
@@ -23,10 +25,15 @@ bool parseListen(const QString& text, QString* host, quint16* port) {
 
 // A host name or an IP address, as it may stand before the port in a Host header.
 bool isHostName(const QString& name) {
+    if (name.contains(QLatin1Char(':'))) {
+        QString address = name;
+        if (address.startsWith(QLatin1Char('[')) && address.endsWith(QLatin1Char(']')))
+            address = address.mid(1, address.size() - 2);
+        in6_addr parsed{};
+        return inet_pton(AF_INET6, address.toLatin1().constData(), &parsed) == 1;
+    }
     static const QRegularExpression hostName(QStringLiteral("^[A-Za-z0-9._-]+$"));
-    static const QRegularExpression ipv6(QStringLiteral("^\\[?[0-9A-Fa-f:.]+\\]?$"));
-    return hostName.match(name).hasMatch() ||
-           (name.contains(QLatin1Char(':')) && ipv6.match(name).hasMatch());
+    return hostName.match(name).hasMatch();
 }
 
 } // namespace

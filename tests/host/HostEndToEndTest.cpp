@@ -389,6 +389,7 @@ TEST(HostUsageTest, ExitsWith2AndAMessage) {
         {{"request", "--token-file", "token", "areaZoom"}, "--token-file"},
         {{"serve", "--allow-host", "console.test:8700"}, "--allow-host"},
         {{"serve", "--allow-host", "a/b"}, "--allow-host"},
+        {{"serve", "--allow-host", "cafe:80"}, "--allow-host"},
         {{"serve", "--token-file", ""}, "--token-file"},
         {{"request", "--bogus", "areaZoom"}, "bogus"},
         {{"serve", "--listen", "nowhere"}, "--listen"},
