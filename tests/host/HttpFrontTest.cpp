@@ -322,7 +322,7 @@ TEST_F(HttpFrontTest, AnswersItsOwnNamesWithTheTokenAndJsonWithinTheLimits) {
     }
     EXPECT_EQ(statuses.join('\n').toStdString(), expected.join('\n').toStdString());
     EXPECT_FALSE(serve.errors().contains(TOKEN));
-    EXPECT_EQ(serve.stop(), 0);
+    EXPECT_EQ(serve.stop(), 0) << qPrintable(serve.errors());
 }
 
 TEST_F(HttpFrontTest, AnswersRequestsBesideAFullSetOfEventStreamsAndRefusesOneMore) {
@@ -388,7 +388,7 @@ TEST_F(HttpFrontTest, AnswersRequestsBesideAFullSetOfEventStreamsAndRefusesOneMo
             return next->read().contains(": subscribed");
         },
         WAIT_MS));
-    EXPECT_EQ(serve.stop(), 0);
+    EXPECT_EQ(serve.stop(), 0) << qPrintable(serve.errors());
 }
 
 // A client that trickles its request in or holds connections idle keeps neither them nor the
@@ -433,7 +433,7 @@ TEST_F(HttpFrontTest, CutsOffSlowAndIdleConnectionsAndBoundsThem) {
         exchange(serve.port(), request("GET /api/plugins HTTP/1.1",
                                        {host(), QByteArray("Authorization: Bearer ") + TOKEN}));
     EXPECT_EQ(answer.status, 200);
-    EXPECT_EQ(serve.stop(), 0);
+    EXPECT_EQ(serve.stop(), 0) << qPrintable(serve.errors());
 }
 
 TEST(HttpFrontTokenTest, PrintsOnlyAMadeTokenAndWritesTheFileForTheOwnerOnly) {
@@ -476,7 +476,7 @@ TEST(HttpFrontTokenTest, PrintsOnlyAMadeTokenAndWritesTheFileForTheOwnerOnly) {
         EXPECT_EQ(
             exchange(serve.port(), head + "Authorization: Bearer " + TOKEN + "\r\n\r\n").status,
             401);
-        EXPECT_EQ(serve.stop(), 0);
+        EXPECT_EQ(serve.stop(), 0) << qPrintable(serve.errors());
         const QStringList lines = serve.lines();
         EXPECT_EQ(lines.size(), row.given.isNull() ? 2 : 1) << qPrintable(lines.join('\n'));
         if (!row.given.isNull()) {
