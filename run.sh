@@ -4,8 +4,10 @@
 set -euo pipefail
 cd "$(dirname "$0")"
 
+# cpp-httplib: the simulated camera and the tests' clients; libmicrohttpd: quenvar-host serve;
+# python3: the Digest server the tests check answers against.
 PACKAGES=(cmake ninja-build g++ pkg-config ccache openssl qt6-base-dev libgtest-dev libgmock-dev
-    libcpp-httplib-dev libssl-dev rapidjson-dev libhttp-parser-dev python3)
+    libcpp-httplib-dev libssl-dev rapidjson-dev libhttp-parser-dev libmicrohttpd-dev python3)
 # The demo reads the event stream with curl and formats JSON with jq.
 DEMO_PACKAGES=(curl jq)
 # Benchmarks: Google Benchmark, and the peers they are measured against.

@@ -1,13 +1,25 @@
 #include "EventQueue.h"
 
+#include "HostLog.h"
+
 void EventQueue::push(const HostEvent& event) {
     {
         std::lock_guard<std::mutex> lock(mutex);
         if (closed)
             return;
-        events.push_back(event);
+        if (events.size() >= CAPACITY) {
+            closed = true;
+            events.clear();
+            hostLog().print(KalbLogClient::Failure, __FILE__, __LINE__, "%s",
+                            qUtf8Printable(QStringLiteral("closing an event stream of subscriber "
+                                                          "%1: %2 events wait for its reader")
+                                               .arg(event.subscriberId)
+                                               .arg(CAPACITY)));
+        } else {
+            events.push_back(event);
+        }
     }
-    changed.notify_all();
+    notify();
 }
 
 std::optional<HostEvent> EventQueue::next(std::chrono::milliseconds timeout) {
@@ -23,13 +35,31 @@ std::optional<HostEvent> EventQueue::next(std::chrono::milliseconds timeout) {
 void EventQueue::close() {
     {
         std::lock_guard<std::mutex> lock(mutex);
+        if (closed)
+            return;
         closed = true;
         events.clear();
     }
-    changed.notify_all();
+    notify();
 }
 
 bool EventQueue::isClosed() const {
     std::lock_guard<std::mutex> lock(mutex);
     return closed;
+}
+
+void EventQueue::setListener(std::function<void()> listener) {
+    std::lock_guard<std::mutex> lock(mutex);
+    this->listener = std::move(listener);
+}
+
+void EventQueue::notify() {
+    changed.notify_all();
+    std::function<void()> callback;
+    {
+        std::lock_guard<std::mutex> lock(mutex);
+        callback = listener;
+    }
+    if (callback)
+        callback();
 }

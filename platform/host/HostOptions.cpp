@@ -1,6 +1,9 @@
 #include "HostOptions.h"
 
 #include <QCommandLineParser>
+#include <QRegularExpression>
+
+#include <arpa/inet.h>
 
 namespace {
 
@@ -20,6 +23,19 @@ bool parseListen(const QString& text, QString* host, quint16* port) {
     return true;
 }
 
+// A host name or an IP address, as it may stand before the port in a Host header.
+bool isHostName(const QString& name) {
+    if (name.contains(QLatin1Char(':'))) {
+        QString address = name;
+        if (address.startsWith(QLatin1Char('[')) && address.endsWith(QLatin1Char(']')))
+            address = address.mid(1, address.size() - 2);
+        in6_addr parsed{};
+        return inet_pton(AF_INET6, address.toLatin1().constData(), &parsed) == 1;
+    }
+    static const QRegularExpression hostName(QStringLiteral("^[A-Za-z0-9._-]+$"));
+    return hostName.match(name).hasMatch();
+}
+
 } // namespace
 
 bool HostOptions::parse(const QStringList& arguments, QString* error) {
@@ -30,8 +46,11 @@ bool HostOptions::parse(const QStringList& arguments, QString* error) {
     const QCommandLineOption timeout(QStringLiteral("timeout-ms"), QString(), QStringLiteral("N"));
     const QCommandLineOption listen(QStringLiteral("listen"), QString(),
                                     QStringLiteral("HOST:PORT"));
+    const QCommandLineOption allowHost(QStringLiteral("allow-host"), QString(),
+                                       QStringLiteral("NAME"));
+    const QCommandLineOption token(QStringLiteral("token-file"), QString(), QStringLiteral("FILE"));
     const QCommandLineOption verboseOption(QStringLiteral("verbose"));
-    parser.addOptions({help, plugins, vca, timeout, listen, verboseOption});
+    parser.addOptions({help, plugins, vca, timeout, listen, allowHost, token, verboseOption});
     if (!parser.parse(QStringList{QStringLiteral("quenvar-host")} + arguments)) {
         *error = parser.errorText();
         return false;
@@ -65,9 +84,11 @@ bool HostOptions::parse(const QStringList& arguments, QString* error) {
     }
 
     if (mode == Mode::Request) {
-        if (parser.isSet(listen)) {
-            *error = QStringLiteral("--listen belongs to serve");
-            return false;
+        for (const QCommandLineOption& option : {listen, allowHost, token}) {
+            if (parser.isSet(option)) {
+                *error = QStringLiteral("--%1 belongs to serve").arg(option.names().first());
+                return false;
+            }
         }
         if (parser.isSet(timeout)) {
             bool ok = false;
@@ -103,6 +124,20 @@ bool HostOptions::parse(const QStringList& arguments, QString* error) {
         *error = QStringLiteral("--listen needs HOST:PORT, not \"%1\"").arg(parser.value(listen));
         return false;
     }
+    allowedHosts = parser.values(allowHost);
+    for (const QString& name : std::as_const(allowedHosts)) {
+        if (!isHostName(name)) {
+            *error = QStringLiteral("--allow-host needs a host name or address without a port, "
+                                    "not \"%1\"")
+                         .arg(name);
+            return false;
+        }
+    }
+    tokenFile = parser.value(token);
+    if (parser.isSet(token) && tokenFile.isEmpty()) {
+        *error = QStringLiteral("--token-file needs a file");
+        return false;
+    }
     return true;
 }
 
@@ -110,8 +145,8 @@ QString HostOptions::usage() {
     return QStringLiteral(
         "usage: quenvar-host request [--plugins DIR] [--vca-dir DIR] [--timeout-ms N] [--verbose]\n"
         "                            COMMAND [PARAMS_JSON]\n"
-        "       quenvar-host serve [--plugins DIR] [--vca-dir DIR] [--listen HOST:PORT] "
-        "[--verbose]\n"
+        "       quenvar-host serve [--plugins DIR] [--vca-dir DIR] [--listen HOST:PORT]\n"
+        "                          [--allow-host NAME]... [--token-file FILE] [--verbose]\n"
         "\n"
         "request  sends one client request to PluginQuenvar and prints its answer as\n"
         "         {\"handled\":B,\"code\":S,\"message\":S,\"payload\":P}; exit status 0 when\n"
@@ -119,9 +154,15 @@ QString HostOptions::usage() {
         "         (default 30000), 2 for a usage error\n"
         "serve    serves POST /api/request, GET /api/events?subscriber=ID (Server-Sent Events)\n"
         "         and GET /api/plugins on HOST:PORT (default 127.0.0.1:8700; port 0 picks a\n"
-        "         free one)\n"
+        "         free one) to requests with Authorization: Bearer TOKEN, TOKEN from\n"
+        "         QUENVAR_HOST_TOKEN (16 characters or more) or made for the run and printed\n"
+        "         as the second line, \"token: TOKEN\"\n"
         "\n"
-        "--plugins DIR   the plugin folder (default: the plugins folder beside the executable's)\n"
-        "--vca-dir DIR   the simulated VCA plugin's data folder (sets VCASIM_DIR)\n"
-        "--verbose       logging level 5: the plugins' and the host's traces\n");
+        "--plugins DIR      the plugin folder (default: the plugins folder beside the\n"
+        "                   executable's)\n"
+        "--vca-dir DIR      the simulated VCA plugin's data folder (sets VCASIM_DIR)\n"
+        "--allow-host NAME  serve requests whose Host is NAME:PORT too (repeatable); the\n"
+        "                   loopback names and the listen address always are\n"
+        "--token-file FILE  also write the token to FILE, readable by the owner only\n"
+        "--verbose          logging level 5: the plugins' and the host's traces\n");
 }

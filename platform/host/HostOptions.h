@@ -22,6 +22,8 @@ public:
     int timeoutMs = DEFAULT_TIMEOUT_MS;
     QString listenHost = QStringLiteral("127.0.0.1");
     quint16 listenPort = DEFAULT_PORT;
+    QStringList allowedHosts; // further names of serve's Host header, without a port
+    QString tokenFile;
     bool verbose = false;
     QString command;
     bool hasParams = false;

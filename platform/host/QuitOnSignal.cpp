@@ -20,12 +20,14 @@ void onSignal(int) {
 } // namespace
 
 QuitOnSignal::QuitOnSignal() {
-    if (::socketpair(AF_UNIX, SOCK_STREAM, 0, signalPipe) != 0)
+    // Non-blocking: a burst of signals that fills the pair must not block the handler.
+    if (::socketpair(AF_UNIX, SOCK_STREAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0, signalPipe) != 0)
         return;
     notifier = new QSocketNotifier(signalPipe[1], QSocketNotifier::Read, this);
-    connect(notifier, &QSocketNotifier::activated, this, []() {
-        char byte = 0;
-        [[maybe_unused]] const ssize_t got = ::read(signalPipe[1], &byte, 1);
+    connect(notifier, &QSocketNotifier::activated, this, [this]() {
+        char bytes[64];
+        [[maybe_unused]] const ssize_t got = ::read(signalPipe[1], bytes, sizeof bytes);
+        signalled = true;
         QCoreApplication::quit();
     });
     struct sigaction action {};
@@ -37,8 +39,10 @@ QuitOnSignal::QuitOnSignal() {
 }
 
 QuitOnSignal::~QuitOnSignal() {
-    std::signal(SIGINT, SIG_DFL);
-    std::signal(SIGTERM, SIG_DFL);
+    // Not the default action: a signal during the rest of the shutdown would end the process
+    // with its status.
+    std::signal(SIGINT, SIG_IGN);
+    std::signal(SIGTERM, SIG_IGN);
     delete notifier;
     notifier = nullptr;
     for (int& end : signalPipe) {

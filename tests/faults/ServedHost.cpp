@@ -23,7 +23,8 @@ QJsonObject ServedHost::request(const QString& command, const QVariant& params) 
     return {{"command", command}, {"params", QJsonValue::fromVariant(params)}};
 }
 
-bool ServedHost::serve(const QStringList& arguments, const QProcessEnvironment& environment) {
+bool ServedHost::serve(const QStringList& arguments, QProcessEnvironment environment) {
+    environment.insert(QStringLiteral("QUENVAR_HOST_TOKEN"), QLatin1String(TOKEN));
     return start(BuildPaths::bin("quenvar-host"),
                  QStringList{"serve", "--listen", "127.0.0.1:0"} + arguments, environment);
 }
@@ -38,6 +39,7 @@ QList<ServedHost::Answer> ServedHost::post(const QList<QJsonObject>& requests) c
         const std::string body = QJsonDocument(requests.at(i)).toJson().toStdString();
         senders.emplace_back([this, body, &answer = answers[i], &clock, &open] {
             httplib::Client client("127.0.0.1", port());
+            client.set_bearer_token_auth(TOKEN);
             client.set_read_timeout(READ_TIMEOUT_S, 0);
             const httplib::Result result = client.Post("/api/request", body, "application/json");
             answer.elapsedMs = clock.elapsed();

@@ -5,10 +5,12 @@
 #include <QJsonObject>
 #include <QList>
 
-// quenvar-host serve with the build's plugins on a free port, and client requests to it. Its
-// exit code from stop() is not 0 after a crash or, under ASan, a leak.
+// quenvar-host serve with the build's plugins on a free port, and client requests to it with its
+// token. Its exit code from stop() is not 0 after a crash or, under ASan, a leak.
 class ServedHost : public ListeningProcess {
 public:
+    static constexpr char TOKEN[] = "faults-test-token";
+
     struct Answer {
         int status = 0; // 0: no HTTP answer
         QJsonObject json;
@@ -17,8 +19,9 @@ public:
 
     static QJsonObject request(const QString& command, const QVariant& params);
 
+    // The environment gets TOKEN as the host's token.
     bool serve(const QStringList& arguments = {},
-               const QProcessEnvironment& environment = QProcessEnvironment::systemEnvironment());
+               QProcessEnvironment environment = QProcessEnvironment::systemEnvironment());
     // Sends every request at once, each on a connection of its own, and returns the answers in
     // the same order.
     QList<Answer> post(const QList<QJsonObject>& requests) const;

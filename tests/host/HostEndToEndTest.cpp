@@ -24,6 +24,8 @@ namespace {
 
 const QString QUENVAR_ID = QStringLiteral("4a6c7db2eaf84341b0a1e30507161c73");
 const QString VCA_ID = QStringLiteral("2F4484ECD91046658F567F2B3B0FDAFD");
+// serve's bearer token, given through the environment.
+const char TOKEN[] = "end-to-end-test-token";
 const QString EMPTY_XML_RULES =
     QStringLiteral("<?xml version='1.0' encoding='UTF-8'?><Rules></Rules>");
 
@@ -80,10 +82,7 @@ QByteArray liveRequestLine(const QByteArray& camera) {
 class EventStream {
 public:
     EventStream(QNetworkAccessManager& network, quint16 port, const QString& subscriberId)
-        : reply(network.get(
-              QNetworkRequest(QUrl(QStringLiteral("http://127.0.0.1:%1/api/events?subscriber=%2")
-                                       .arg(port)
-                                       .arg(subscriberId))))) {}
+        : reply(network.get(request(port, subscriberId))) {}
 
     // Waits for the opening comment, which says the host has subscribed, or for events.
     bool waitFor(const char* text, int times = 1) {
@@ -105,6 +104,14 @@ public:
     }
 
 private:
+    static QNetworkRequest request(quint16 port, const QString& subscriberId) {
+        QNetworkRequest request(QUrl(QStringLiteral("http://127.0.0.1:%1/api/events?subscriber=%2")
+                                         .arg(port)
+                                         .arg(subscriberId)));
+        request.setRawHeader("Authorization", QByteArray("Bearer ") + TOKEN);
+        return request;
+    }
+
     const QByteArray& read() { return text += reply->readAll(); }
 
     std::unique_ptr<QNetworkReply> reply;
@@ -121,9 +128,12 @@ protected:
 
     QString vcaPath(const QString& name) const { return QDir(vca.path()).filePath(name); }
     bool startServe(const QStringList& extra = {}) {
+        QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
+        environment.insert("QUENVAR_HOST_TOKEN", TOKEN);
         return serve.start(
             BuildPaths::bin("quenvar-host"),
-            QStringList{"serve", "--listen", "127.0.0.1:0", "--vca-dir", vca.path()} + extra);
+            QStringList{"serve", "--listen", "127.0.0.1:0", "--vca-dir", vca.path()} + extra,
+            environment);
     }
 
     QTemporaryDir vca;
@@ -188,6 +198,7 @@ TEST_F(HostEndToEndTest, AnswersOverBothFronts) {
     QStringList expected;
     QByteArray vcaLog;
     httplib::Client client("127.0.0.1", serve.port());
+    client.set_bearer_token_auth(TOKEN);
     client.set_read_timeout(60, 0);
     for (const auto& row : rows) {
         const QByteArray params = QByteArray(row.params).replace("CAMERA", connection);
@@ -227,6 +238,7 @@ TEST_F(HostEndToEndTest, ServesPluginsAndEventsAndRejectsBadRequests) {
     ASSERT_TRUE(writeFile(vcaPath("live/cam1.xml"), liveRules("cam1", "{\"sensitivity\":80}")));
     ASSERT_TRUE(startServe({"--verbose"})) << qPrintable(serve.errorOutput());
     httplib::Client client("127.0.0.1", serve.port());
+    client.set_bearer_token_auth(TOKEN);
 
     QStringList statuses;
     for (const char* body : {"", "nope", "[]", "{}", R"({"command":7})"}) {
@@ -373,6 +385,12 @@ TEST(HostUsageTest, ExitsWith2AndAMessage) {
         {{"request", "areaZoom", "1,2"}, "PARAMS_JSON is more than one JSON value"},
         {{"request", "--timeout-ms", "0", "areaZoom"}, "--timeout-ms"},
         {{"request", "--listen", "127.0.0.1:0", "areaZoom"}, "--listen"},
+        {{"request", "--allow-host", "console.test", "areaZoom"}, "--allow-host"},
+        {{"request", "--token-file", "token", "areaZoom"}, "--token-file"},
+        {{"serve", "--allow-host", "console.test:8700"}, "--allow-host"},
+        {{"serve", "--allow-host", "a/b"}, "--allow-host"},
+        {{"serve", "--allow-host", "cafe:80"}, "--allow-host"},
+        {{"serve", "--token-file", ""}, "--token-file"},
         {{"request", "--bogus", "areaZoom"}, "bogus"},
         {{"serve", "--listen", "nowhere"}, "--listen"},
         {{"serve", "areaZoom"}, "serve takes no arguments"},

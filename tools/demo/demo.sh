@@ -1,6 +1,7 @@
 #!/usr/bin/env bash
 # The plugin at work: ten client requests through quenvar-host against a simulated camera and a
-# simulated VCA plugin, then a rule change arriving as an event on the HTTP front's stream.
+# simulated VCA plugin, then the HTTP front with its token: a request, and a rule change arriving
+# as an event on its stream.
 # Usage: tools/demo/demo.sh [BUILD_DIR]   (run by ./run.sh demo after the build)
 set -euo pipefail
 cd "$(dirname "$0")/../.."
@@ -123,9 +124,24 @@ pids+=($!)
 serve_url=$(wait_for_line "$work/serve.out" '^listening on ' 10) ||
     fail "quenvar-host serve did not start: $(cat "$work/serve.err")"
 serve_url=${serve_url#listening on }
+# Without QUENVAR_HOST_TOKEN, serve makes a token for the run and prints it as its second line.
+token=$(wait_for_line "$work/serve.out" '^token: ' 10) || fail "quenvar-host serve printed no token"
+token=${token#token: }
+# curl reads the header from a file, so that the token stays off command lines.
+auth_header="$work/auth-header"
+(umask 077 && printf 'Authorization: Bearer %s\n' "$token" >"$auth_header")
 echo "quenvar-host serve: $serve_url"
 
-curl -sN "$serve_url/api/events?subscriber=demo" >"$work/events.txt" &
+status=$(curl -s -o /dev/null -w '%{http_code}' "$serve_url/api/plugins")
+[ "$status" = 401 ] || fail "GET /api/plugins without the token: HTTP $status, not 401"
+echo "GET /api/plugins without the token: HTTP $status"
+answer=$(curl -s -H @"$auth_header" -H 'Content-Type: application/json' \
+    -d '{"command":"retrieveVcaRawRuleInfo","params":"cam1"}' "$serve_url/api/request")
+code=$(jq -r '.code' <<<"$answer" 2>/dev/null) || code=
+[ "$code" = 0 ] || fail "POST /api/request with the token: $answer"
+echo "POST /api/request retrieveVcaRawRuleInfo with the token: code $code"
+
+curl -sN -H @"$auth_header" "$serve_url/api/events?subscriber=demo" >"$work/events.txt" &
 pids+=($!)
 wait_for_line "$work/events.txt" '^: subscribed' 10 >/dev/null ||
     fail "could not subscribe to $serve_url/api/events"
