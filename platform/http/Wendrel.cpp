@@ -44,22 +44,6 @@ WendrelRequest fromUrlText(const QByteArray& method, const QString& text, const 
                        given ? password : urlPassword, std::move(callback), timeout);
 }
 
-// Runs the worker's event loop; once the loop has ended, deletes the worker and what it left to
-// delete later, then frees the thread's OpenSSL state. All of it is gone before wait() returns,
-// so that a process that ends right after destroying its client leaves nothing behind.
-class WorkerThread : public QThread {
-public:
-    QObject* worker = nullptr;
-
-protected:
-    void run() override {
-        exec();
-        delete worker;
-        QCoreApplication::sendPostedEvents(nullptr, QEvent::DeferredDelete);
-        OPENSSL_thread_stop();
-    }
-};
-
 } // namespace
 
 WendrelSettings WendrelSettings::fromEnvironment() {
@@ -73,12 +57,12 @@ WendrelSettings WendrelSettings::fromEnvironment() {
 class Wendrel::WendrelPrivate {
 public:
     explicit WendrelPrivate(const WendrelSettings& settings)
-        : thread(new WorkerThread)
+        : thread(new QThread)
         , worker(new WendrelWorker(settings)) {
         thread->setObjectName(QStringLiteral("Wendrel"));
         worker->moveToThread(thread);
-        // The worker dies on its own thread.
-        thread->worker = worker;
+        // Deferred deletes run as the thread finishes, so the worker dies on its own thread.
+        QObject::connect(thread, &QThread::finished, worker, &QObject::deleteLater);
         thread->start();
     }
 
@@ -138,7 +122,7 @@ private:
     };
 
     const std::shared_ptr<Incoming> incoming = std::make_shared<Incoming>();
-    WorkerThread* thread;
+    QThread* thread;
     WendrelWorker* worker;
 };
 

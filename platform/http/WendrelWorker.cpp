@@ -9,6 +9,7 @@
 
 #include <algorithm>
 #include <climits>
+#include <openssl/crypto.h>
 #include <utility>
 
 #if !defined(_WIN32)
@@ -45,6 +46,19 @@ WendrelWorker::WendrelWorker(const WendrelSettings& settings)
     connect(&deadlineTimer, &QTimer::timeout, this, &WendrelWorker::expireDeadlines);
     idleTimer.setSingleShot(true);
     connect(&idleTimer, &QTimer::timeout, this, &WendrelWorker::closeIdleConnections);
+}
+
+WendrelWorker::~WendrelWorker() {
+    // The connections and their sockets first, then the thread's OpenSSL state, which would
+    // otherwise be freed only after QThread::wait() returned: a process that ends right after
+    // destroying its client would then leave it behind.
+    const QObjectList owned = children();
+    for (QObject* child : owned) {
+        // Every child but the timers is a connection.
+        if (child != &deadlineTimer && child != &idleTimer)
+            delete child;
+    }
+    OPENSSL_thread_stop();
 }
 
 void WendrelWorker::start(WendrelRequest request) {

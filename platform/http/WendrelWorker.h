@@ -32,6 +32,8 @@ struct WendrelSettings;
 class WendrelWorker : public QObject {
 public:
     explicit WendrelWorker(const WendrelSettings& settings);
+    // On the worker thread, as it finishes.
+    ~WendrelWorker() override;
 
     void start(WendrelRequest request);
     // Answers everything queued or in flight with OperationCanceledError and closes every
