@@ -9,7 +9,6 @@
 
 #include <gtest/gtest.h>
 
-#include <ostream>
 #include <string>
 
 namespace {
@@ -339,61 +338,52 @@ struct Exchange {
     const char* verdicts; // the server's, one per request it received, joined by "; "
 };
 
-void PrintTo(const Exchange& row, std::ostream* out) {
-    *out << row.name;
-}
-
-class DigestInteropTest : public ::testing::TestWithParam<Exchange> {};
-
-TEST_P(DigestInteropTest, ServerAcceptsWhatItShould) {
-    const Exchange& row = GetParam();
-    QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
-    environment.insert(QStringLiteral("PYTHONUTF8"), QStringLiteral("1")); // the user's name
-    ListeningProcess server;
-    ASSERT_TRUE(server.start(
-        QStringLiteral(QUENVAR_PYTHON3),
-        QStringList{QStringLiteral(DIGEST_SERVER), "--user", row.user, "--password", PASSWORD} +
-            QString::fromLatin1(row.serverArguments).split(' '),
-        environment))
-        << qPrintable(server.errorOutput());
-    ReplyRecorder recorder;
-    Wendrel client(WendrelSettings{});
-    for (int i = 0; i < 3; ++i) {
-        ASSERT_TRUE(client.Get("127.0.0.1", PATHS[i], server.port(), false, row.user, row.password,
-                               recorder.callback(i), 10000, {}));
-        ASSERT_TRUE(recorder.waitFor(i + 1, 10000));
-    }
-    QStringList errors;
-    for (const std::string& error : recorder.said(false))
-        errors << QString::fromStdString(error);
-    EXPECT_EQ(errors.join(' ').toStdString(), row.errors);
-    EXPECT_EQ(server.errorOutput().trimmed().replace('\n', "; ").toStdString(), row.verdicts);
-}
-
 const char* const PASSED = "NoError NoError NoError";
 
-INSTANTIATE_TEST_SUITE_P(
-    Exchanges, DigestInteropTest,
-    ::testing::Values(
-        // The first Digest challenge that can be answered, over Basic, for a name not in ASCII.
-        Exchange{"Sha256UsernameStar", "--offer SHA3-256,SHA-256,MD5,Basic", JASON, PASSWORD,
-                 PASSED, "none; ok SHA-256 username*; ok SHA-256 username*; ok SHA-256 username*"},
-        Exchange{"Sha512_256Userhash", "--offer SHA-512-256 --userhash", JASON, PASSWORD, PASSED,
-                 "none; ok SHA-512-256 userhash; ok SHA-512-256 userhash; "
-                 "ok SHA-512-256 userhash"},
-        // Each nonce serves one request: the next is answered afresh, not refused.
-        Exchange{"StaleSessionNonce", "--offer SHA-256-sess --nonce-uses 1", MUFASA, PASSWORD,
-                 PASSED,
-                 "none; ok SHA-256-sess username; digest stale; ok SHA-256-sess username; "
-                 "digest stale; ok SHA-256-sess username"},
-        // After Digest worked over plain HTTP, the server asks for Basic: never sent.
-        Exchange{"DowngradeRefused", "--offer SHA-256,Basic --basic-after-digest", MUFASA, PASSWORD,
-                 "NoError AuthenticationRequiredError AuthenticationRequiredError",
-                 "none; ok SHA-256 username; digest unasked SHA-256; none"},
-        Exchange{"WrongPassword", "--offer MD5", MUFASA, "wrong",
-                 "AuthenticationRequiredError AuthenticationRequiredError "
-                 "AuthenticationRequiredError",
-                 "none; digest wrong; none; digest wrong; none; digest wrong"}),
-    [](const auto& info) { return std::string(info.param.name); });
+const Exchange EXCHANGES[] = {
+    // The first Digest challenge that can be answered, over Basic, for a name not in ASCII.
+    {"Sha256UsernameStar", "--offer SHA3-256,SHA-256,MD5,Basic", JASON, PASSWORD, PASSED,
+     "none; ok SHA-256 username*; ok SHA-256 username*; ok SHA-256 username*"},
+    {"Sha512_256Userhash", "--offer SHA-512-256 --userhash", JASON, PASSWORD, PASSED,
+     "none; ok SHA-512-256 userhash; ok SHA-512-256 userhash; ok SHA-512-256 userhash"},
+    // Each nonce serves one request: the next is answered afresh, not refused.
+    {"StaleSessionNonce", "--offer SHA-256-sess --nonce-uses 1", MUFASA, PASSWORD, PASSED,
+     "none; ok SHA-256-sess username; digest stale; ok SHA-256-sess username; "
+     "digest stale; ok SHA-256-sess username"},
+    // After Digest worked over plain HTTP, the server asks for Basic: never sent.
+    {"DowngradeRefused", "--offer SHA-256,Basic --basic-after-digest", MUFASA, PASSWORD,
+     "NoError AuthenticationRequiredError AuthenticationRequiredError",
+     "none; ok SHA-256 username; digest unasked SHA-256; none"},
+    {"WrongPassword", "--offer MD5", MUFASA, "wrong",
+     "AuthenticationRequiredError AuthenticationRequiredError AuthenticationRequiredError",
+     "none; digest wrong; none; digest wrong; none; digest wrong"},
+};
+
+TEST(DigestInteropTest, ServerAcceptsWhatItShould) {
+    for (const Exchange& row : EXCHANGES) {
+        SCOPED_TRACE(row.name);
+        QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
+        environment.insert(QStringLiteral("PYTHONUTF8"), QStringLiteral("1")); // the user's name
+        ListeningProcess server;
+        ASSERT_TRUE(server.start(
+            QStringLiteral(QUENVAR_PYTHON3),
+            QStringList{QStringLiteral(DIGEST_SERVER), "--user", row.user, "--password", PASSWORD} +
+                QString::fromLatin1(row.serverArguments).split(' '),
+            environment))
+            << qPrintable(server.errorOutput());
+        ReplyRecorder recorder;
+        Wendrel client(WendrelSettings{});
+        for (int i = 0; i < 3; ++i) {
+            ASSERT_TRUE(client.Get("127.0.0.1", PATHS[i], server.port(), false, row.user,
+                                   row.password, recorder.callback(i), 10000, {}));
+            ASSERT_TRUE(recorder.waitFor(i + 1, 10000));
+        }
+        QStringList errors;
+        for (const std::string& error : recorder.said(false))
+            errors << QString::fromStdString(error);
+        EXPECT_EQ(errors.join(' ').toStdString(), row.errors);
+        EXPECT_EQ(server.errorOutput().trimmed().replace('\n', "; ").toStdString(), row.verdicts);
+    }
+}
 
 } // namespace

@@ -109,11 +109,6 @@ INSTANTIATE_TEST_SUITE_P(
              "GET GET GET",
              "NoError reached: abcde; NoError reached: f; NoError reached: all of it", 1,
              "1 GET /0; 1 GET /1; 1 GET /2"},
-        // An interim answer before the final one; a status line that is none.
-        Case{"StatusLines",
-             script("HTTP/1.1 100 Continue\r\n\r\nHTTP/1.1 200 OK\r\nContent-Length: 1\r\n\r\nz",
-                    Reply{"HTTP/9 banana\r\n\r\n", true}),
-             "POST GET", "NoError reached: z; ProtocolFailure reached", 1, "1 POST /0; 1 GET /1"},
         Case{"ErrorStatus",
              script(status("404 Not Found"), status("500 Oops"), status("503 Busy"), ok("b")),
              "GET GET GET GET",
