@@ -36,6 +36,11 @@ Reply redirect(const QByteArray& status, const QByteArray& location) {
             "\r\nContent-Length: 5\r\n\r\nmoved"};
 }
 
+Reply challenge(const QByteArray& parameters) {
+    return {"HTTP/1.1 401 Unauthorized\r\nWWW-Authenticate: Digest realm=\"r\", " + parameters +
+            "\r\nContent-Length: 0\r\n\r\n"};
+}
+
 Reply status(const QByteArray& status) {
     return {"HTTP/1.1 " + status + "\r\nContent-Length: 4\r\n\r\nbusy"};
 }
@@ -65,10 +70,10 @@ TEST_P(WendrelConnectionTest, AnswersAsTheServerSaid) {
         for (int id = 0; id < methods.size(); ++id) {
             const QString path = QStringLiteral("/%1").arg(id);
             if (methods[id] == "GET")
-                client.Get(HOST, path, server.serverPort(), false, {}, {}, recorder.callback(id),
-                           5000, {});
+                client.Get(HOST, path, server.serverPort(), false, "operator", "pw",
+                           recorder.callback(id), 5000, {});
             else
-                client.Post(HOST, "a=1", path, server.serverPort(), false, {}, {}, FORM,
+                client.Post(HOST, "a=1", path, server.serverPort(), false, "operator", "pw", FORM,
                             recorder.callback(id), 5000);
             ASSERT_TRUE(recorder.waitFor(id + 1));
         }
@@ -109,6 +114,13 @@ INSTANTIATE_TEST_SUITE_P(
              "GET GET GET",
              "NoError reached: abcde; NoError reached: f; NoError reached: all of it", 1,
              "1 GET /0; 1 GET /1; 1 GET /2"},
+        // A stale nonce is no rejection: the answer goes once more, with the new nonce; once.
+        Case{"StaleNonce",
+             script(challenge("nonce=a"), challenge("nonce=b, stale=true"), ok("in"),
+                    challenge("nonce=c, stale=true"), challenge("nonce=d, stale=true"),
+                    challenge("nonce=e, stale=true")),
+             "GET GET", "NoError reached: in; AuthenticationRequiredError reached", 1,
+             "1 GET /0; 1 GET /0; 1 GET /0; 1 GET /1; 1 GET /1; 1 GET /1"},
         Case{"ErrorStatus",
              script(status("404 Not Found"), status("500 Oops"), status("503 Busy"), ok("b")),
              "GET GET GET GET",
@@ -190,43 +202,38 @@ Send postAs(const QString& contentType) {
     };
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Requests, WendrelUnsentTest,
-    ::testing::Values(Unsent{"UserNameWithLineBreaks", getAs("admin\"" + SMUGGLED, "pw")},
-                      Unsent{"UserNameWithNul", getAs(QString::fromLatin1("adm\0in", 6), "pw")},
-                      Unsent{"UserNameWithOtherControl", getAs("adm\x1bin", "pw")},
-                      Unsent{"PasswordWithLineFeed", getAs("admin", "pw\nX-Smuggled: 1")},
-                      Unsent{"PasswordWithDelete", getAs("admin", "pw\x7f")},
-                      Unsent{"HeaderNameNotAToken", getAs("", "", {"X Probe: 1"})},
-                      Unsent{"HeaderWithoutName", getAs("", "", {": 1"})},
-                      Unsent{"HeaderWithoutColon", getAs("", "", {"X-Probe"})},
-                      Unsent{"HeaderValueWithLineBreak", getAs("", "", {"X-Probe: 1" + SMUGGLED})},
-                      Unsent{"HeaderValueWithNul",
-                             getAs("", "", {QString::fromLatin1("X-Probe: 1\0", 12)})},
-                      Unsent{"ContentTypeWithLineBreak", postAs("text/plain\r\nX-Smuggled: 1")},
-                      Unsent{"BearerTokenWithLineBreak",
-                             [](Wendrel& client, quint16 port, const HttpReplyCallback& callback) {
-                                 client.PostWithOAuth(HOST, "a=1", "/x", port, false, {},
-                                                      "t0ken" + SMUGGLED, FORM, callback, 5000);
-                             }},
-                      Unsent{"UrlCredentialsWithLineBreak",
-                             [](Wendrel& client, quint16 port, const HttpReplyCallback& callback) {
-                                 client.Get("http://admin%0D%0AX-Smuggled:%201:pw@127.0.0.1:" +
-                                                QString::number(port) + "/x",
-                                            {}, {}, callback, 5000);
-                             }},
-                      Unsent{"Refused", getAs("", ""), "ConnectionRefusedError unreached"},
-                      Unsent{"NotHttp",
-                             [](Wendrel& client, quint16, const HttpReplyCallback& callback) {
-                                 client.Get("ftp://127.0.0.1/x", {}, {}, callback, 5000);
-                             },
-                             "ProtocolUnknownError unreached"},
-                      Unsent{"NoHost",
-                             [](Wendrel& client, quint16, const HttpReplyCallback& callback) {
-                                 client.Get({}, "/x", 0, false, {}, {}, callback, 5000, {});
-                             },
-                             "HostNotFoundError unreached"}),
-    [](const ::testing::TestParamInfo<Unsent>& info) { return std::string(info.param.name); });
+Send getUrl(const QString& url) {
+    return [=](Wendrel& client, quint16 port, const HttpReplyCallback& callback) {
+        client.Get(QString(url).replace("PORT", QString::number(port)), {}, {}, callback, 5000);
+    };
+}
+
+const Unsent UNSENT[] = {
+    {"UserNameWithLineBreaks", getAs("admin\"" + SMUGGLED, "pw")},
+    {"UserNameWithNul", getAs(QString::fromLatin1("adm\0in", 6), "pw")},
+    {"UserNameWithOtherControl", getAs("adm\x1bin", "pw")},
+    {"PasswordWithLineFeed", getAs("admin", "pw\nX-Smuggled: 1")},
+    {"PasswordWithDelete", getAs("admin", "pw\x7f")},
+    {"HeaderNameNotAToken", getAs("", "", {"X Probe: 1"})},
+    {"HeaderWithoutName", getAs("", "", {": 1"})},
+    {"HeaderWithoutColon", getAs("", "", {"X-Probe"})},
+    {"HeaderValueWithLineBreak", getAs("", "", {"X-Probe: 1" + SMUGGLED})},
+    {"HeaderValueWithNul", getAs("", "", {QString::fromLatin1("X-Probe: 1\0", 12)})},
+    {"ContentTypeWithLineBreak", postAs("text/plain\r\nX-Smuggled: 1")},
+    {"BearerTokenWithLineBreak",
+     [](Wendrel& client, quint16 port, const HttpReplyCallback& callback) {
+         client.PostWithOAuth(HOST, "a=1", "/x", port, false, {}, "t0ken" + SMUGGLED, FORM,
+                              callback, 5000);
+     }},
+    {"UrlCredentialsWithLineBreak",
+     getUrl("http://admin%0D%0AX-Smuggled:%201:pw@127.0.0.1:PORT/x")},
+    {"Refused", getAs("", ""), "ConnectionRefusedError unreached"},
+    {"NotHttp", getUrl("ftp://127.0.0.1/x"), "ProtocolUnknownError unreached"},
+    {"NoHost", getUrl("http:///x"), "HostNotFoundError unreached"},
+};
+
+INSTANTIATE_TEST_SUITE_P(Requests, WendrelUnsentTest, ::testing::ValuesIn(UNSENT),
+                         [](const auto& info) { return std::string(info.param.name); });
 
 // Callers share the connections to a camera: one caller's hostile request cannot put anything in
 // front of another's, nor take its answer.

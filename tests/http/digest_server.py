@@ -1,8 +1,8 @@
 #!/usr/bin/env python3
-"""An HTTP server on a free loopback port that asks for Digest (RFC 7616) credentials, or Basic
-ones that it never accepts, and checks each answer itself with hashlib. It prints "listening on
-URL"; each request gets its verdict, also written as a line to standard error: 200 with "ok
-ALGORITHM USERNAME-FORM", else 401 with the reason and fresh challenges."""
+"""A loopback HTTP server that asks for Digest (RFC 7616) credentials, or Basic ones it never
+accepts, and checks each answer itself with hashlib. It prints "listening on URL"; each request
+gets its verdict, also a line on standard error: 200 "ok ALGORITHM USERNAME-FORM", else 401 with
+the reason and fresh challenges."""
 
 import argparse
 import hashlib
@@ -79,17 +79,14 @@ class Handler(http.server.BaseHTTPRequestHandler):
         def h(text):
             return hashlib.new(HASHES[base], text.encode()).hexdigest()
         user = self.options.user
+        form, claimed = "username", fields.get("username")
         if fields.get("userhash") == "true":
-            form = "userhash"
-            claimed = user if fields["username"] == h("%s:%s" % (user, REALM)) else None
+            form, claimed = "userhash", user if claimed == h("%s:%s" % (user, REALM)) else None
         elif "username*" in fields:
-            form = "username*"
-            charset, _, encoded = fields.pop("username*").partition("''")
-            if charset != "UTF-8" or "username" in fields:
+            charset, _, encoded = fields["username*"].partition("''")
+            if charset != "UTF-8" or claimed is not None:
                 raise ValueError("username*")
-            claimed = urllib.parse.unquote(encoded, errors="strict")
-        else:
-            form, claimed = "username", fields["username"]
+            form, claimed = "username*", urllib.parse.unquote(encoded, errors="strict")
         if (claimed, fields["realm"], fields["uri"], fields["opaque"]) != \
                 (user, REALM, self.path, OPAQUE):
             return ("digest mismatch",)
