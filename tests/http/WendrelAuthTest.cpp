@@ -1,10 +1,14 @@
+// Answers to servers' challenges, on their own and against a server that checks them itself.
 #include "WendrelAuth.h"
+
+#include "ListeningProcess.h"
+#include "ReplyRecorder.h"
+#include "Wendrel.h"
 
 #include <QFile>
 
 #include <gtest/gtest.h>
 
-#include <ostream>
 #include <string>
 
 namespace {
@@ -17,25 +21,22 @@ const QString JASON = QStringLiteral("J\u00e4s\u00f8n Doe");
 const QString ORIGIN = QStringLiteral("http cam 80");
 
 // RFC 7616, section 3.9.1.
-const QByteArray RFC_CHALLENGE_TAIL = "realm=\"http-auth@example.org\", qop=\"auth, auth-int\", "
-                                      "nonce=\"7ypf/xlj9XXwfDPEoM4URrv/xwf94BcCAzFZH4GiTo0v\", "
-                                      "opaque=\"FQhe/qaU925kfnzjCev0ciny7QMkPqMAFRtzCUYo5tdS\"";
+const QByteArray RFC_NONCE = "7ypf/xlj9XXwfDPEoM4URrv/xwf94BcCAzFZH4GiTo0v";
+const QByteArray RFC_OPAQUE = "FQhe/qaU925kfnzjCev0ciny7QMkPqMAFRtzCUYo5tdS";
 const QByteArray RFC_CNONCE = "f2/wE4q74E6zIJEtWaHKaf5wv/H5QzzpXusqGemxURZJ";
-const QByteArray RFC_ANSWER_HEAD =
-    "realm=\"http-auth@example.org\", uri=\"/dir/index.html\", algorithm=";
-const QByteArray RFC_ANSWER_MIDDLE = ", nonce=\"7ypf/xlj9XXwfDPEoM4URrv/xwf94BcCAzFZH4GiTo0v\", "
-                                     "nc=00000001, cnonce=\"" +
-                                     RFC_CNONCE + "\", qop=auth, response=\"";
-const QByteArray RFC_ANSWER_TAIL = "\", opaque=\"FQhe/qaU925kfnzjCev0ciny7QMkPqMAFRtzCUYo5tdS\"";
 
 QByteArray rfcChallenge(const QByteArray& algorithm) {
-    return "Digest algorithm=" + algorithm + ", " + RFC_CHALLENGE_TAIL;
+    return "Digest algorithm=" + algorithm +
+           ", realm=\"http-auth@example.org\", qop=\"auth, auth-int\", nonce=\"" + RFC_NONCE +
+           "\", opaque=\"" + RFC_OPAQUE + '"';
 }
 
-QByteArray rfcAnswer(const QByteArray& username, const QByteArray& algorithm,
-                     const QByteArray& response) {
-    return "Digest " + username + ", " + RFC_ANSWER_HEAD + algorithm + RFC_ANSWER_MIDDLE +
-           response + RFC_ANSWER_TAIL;
+QByteArray rfcAnswer(const QByteArray& algorithm, const QByteArray& response, int count = 1) {
+    return "Digest username=\"Mufasa\", realm=\"http-auth@example.org\", "
+           "uri=\"/dir/index.html\", algorithm=" +
+           algorithm + ", nonce=\"" + RFC_NONCE + "\", nc=0000000" + QByteArray::number(count) +
+           ", cnonce=\"" + RFC_CNONCE + "\", qop=auth, response=\"" + response + "\", opaque=\"" +
+           RFC_OPAQUE + '"';
 }
 
 struct Vector {
@@ -53,11 +54,10 @@ struct Vector {
 // one is wrong) and, for the forms the RFCs do not show, from Python's hashlib.
 const Vector VECTORS[] = {
     {"Rfc7616Md5", rfcChallenge("MD5"), MUFASA, CIRCLE, "/dir/index.html", RFC_CNONCE, 1,
-     rfcAnswer("username=\"Mufasa\"", "MD5", "8ca523f5e9506fed4657c9700eebdbec")},
+     rfcAnswer("MD5", "8ca523f5e9506fed4657c9700eebdbec")},
     {"Rfc7616Sha256ListedFirst", rfcChallenge("SHA-256") + ", " + rfcChallenge("MD5"), MUFASA,
      CIRCLE, "/dir/index.html", RFC_CNONCE, 1,
-     rfcAnswer("username=\"Mufasa\"", "SHA-256",
-               "753927fa0e85d155564e2e272a28d1802ca10daf4496794697cf8db5856cb6c1")},
+     rfcAnswer("SHA-256", "753927fa0e85d155564e2e272a28d1802ca10daf4496794697cf8db5856cb6c1")},
     {"Rfc7616Sha512_256UserhashErratum4897",
      "Digest realm=\"api@example.org\", qop=\"auth\", algorithm=SHA-512-256, "
      "nonce=\"5TsQWLVdgBdmrQ0XsxbDODV+57QdFR34I9HAbC/RVvkK\", "
@@ -69,29 +69,10 @@ const Vector VECTORS[] = {
      "cnonce=\"NTg6RKcb9boFIAS3KrFK9BGeh+iDa/sm6jUMp2wds69v\", qop=auth, "
      "response=\"3798d4131c277846293534c3edc11bd8a5e4cdcbff78b05db9d95eeb1cec68a5\", "
      "opaque=\"HRPCssKJSGjCrkzDg8OhwpzCiGPChXYjwrI2QmXDnsOS\", userhash=true"},
-    {"NonAsciiUserAsUsernameStar", rfcChallenge("SHA-256") + ", charset=UTF-8", JASON, CIRCLE,
-     "/dir/index.html", RFC_CNONCE, 1,
-     rfcAnswer("username*=UTF-8''J%C3%A4s%C3%B8n%20Doe", "SHA-256",
-               "c5329432b688d2821a9caba0e2ecb6b74604959469eb41c6595dcea281451bed")},
-    {"Md5Sess", rfcChallenge("MD5-sess"), MUFASA, CIRCLE, "/dir/index.html", RFC_CNONCE, 1,
-     rfcAnswer("username=\"Mufasa\"", "MD5-sess", "e783283f46242139c486a698fec7211d")},
-    {"Sha256Sess", rfcChallenge("sha-256-SESS"), MUFASA, CIRCLE, "/dir/index.html", RFC_CNONCE, 1,
-     rfcAnswer("username=\"Mufasa\"", "SHA-256-sess",
-               "2fd51b3a77ad75bad6afad6003e818d767133c46d9e2749e7f5232ae1ea3efd7")},
     {"Sha512_256SessSecondRequest", rfcChallenge("SHA-512-256-sess"), MUFASA, CIRCLE,
      "/dir/index.html", RFC_CNONCE, 2,
-     rfcAnswer("username=\"Mufasa\"", "SHA-512-256-sess",
-               "3f0b079c78edc3f154dc32cd155ef358aab704e07c9fda1f425282a15cc97cf7")
-         .replace("nc=00000001", "nc=00000002")},
-    {"Rfc2617",
-     "Digest realm=\"testrealm@host.com\", qop=\"auth,auth-int\", "
-     "nonce=\"dcd98b7102dd2f0e8b11d0f600bfb0c093\", "
-     "opaque=\"5ccc069c403ebaf9f0171e9517f40e41\"",
-     MUFASA, "Circle Of Life", "/dir/index.html", "0a4f113b", 1,
-     "Digest username=\"Mufasa\", realm=\"testrealm@host.com\", uri=\"/dir/index.html\", "
-     "algorithm=MD5, nonce=\"dcd98b7102dd2f0e8b11d0f600bfb0c093\", nc=00000001, "
-     "cnonce=\"0a4f113b\", qop=auth, response=\"6629fae49393a05397450978507c4ef1\", "
-     "opaque=\"5ccc069c403ebaf9f0171e9517f40e41\""},
+     rfcAnswer("SHA-512-256-sess",
+               "3f0b079c78edc3f154dc32cd155ef358aab704e07c9fda1f425282a15cc97cf7", 2)},
     {"WithoutQop", "Digest realm=\"r\", nonce=\"n\"", MUFASA, "Circle Of Life", "/dir/index.html",
      "0a4f113b", 1,
      "Digest username=\"Mufasa\", realm=\"r\", uri=\"/dir/index.html\", algorithm=MD5, "
@@ -100,33 +81,19 @@ const Vector VECTORS[] = {
      "x\"y", "p", "/", "c", 1,
      "Digest username=\"x\\\"y\", realm=\"a\\\"b\\\\\", uri=\"/\", algorithm=MD5, nonce=\"n\", "
      "response=\"f37058d5a06a2044a8ade2469b5e32c2\", opaque=\"\""},
-    {"Basic", "Basic realm=\"cam\"", MUFASA, "Circle Of Life", "/", "", 1,
-     "Basic TXVmYXNhOkNpcmNsZSBPZiBMaWZl"},
 };
 
-// Failures name the row, not its bytes.
-template <typename Row>
-void printRow(const Row& row, std::ostream* out) {
-    *out << row.name;
+TEST(WendrelAuthTest, AnswersAsTheReferenceDoes) {
+    for (const Vector& row : VECTORS) {
+        SCOPED_TRACE(row.name);
+        const std::optional<WendrelChallenge> chosen = WendrelChallenge::choose(row.challenges);
+        ASSERT_TRUE(chosen);
+        EXPECT_EQ(WendrelAuth::respond(*chosen, "GET", row.target, row.user, row.password,
+                                       row.clientNonce, row.count)
+                      .toStdString(),
+                  row.expected.toStdString());
+    }
 }
-void PrintTo(const Vector& row, std::ostream* out) {
-    printRow(row, out);
-}
-
-class WendrelAuthVectorTest : public ::testing::TestWithParam<Vector> {};
-
-TEST_P(WendrelAuthVectorTest, AnswersAsTheReferenceDoes) {
-    const Vector& row = GetParam();
-    const std::optional<WendrelChallenge> chosen = WendrelChallenge::choose(row.challenges);
-    ASSERT_TRUE(chosen);
-    EXPECT_EQ(WendrelAuth::respond(*chosen, "GET", row.target, row.user, row.password,
-                                   row.clientNonce, row.count)
-                  .toStdString(),
-              row.expected.toStdString());
-}
-
-INSTANTIATE_TEST_SUITE_P(Vectors, WendrelAuthVectorTest, ::testing::ValuesIn(VECTORS),
-                         [](const auto& info) { return std::string(info.param.name); });
 
 struct Choice {
     const char* name;
@@ -141,23 +108,14 @@ QByteArray repeated(const char* format, int count) {
     return text;
 }
 
-// All of a literal, NUL bytes too.
-template <size_t size>
-QByteArray bytes(const char (&literal)[size]) {
-    return QByteArray(literal, size - 1);
-}
-
 const QByteArray LONG_VALUE(WendrelChallenge::maxValueBytes, 'v');
 
 const Choice CHOICES[] = {
-    {"Sha256ListedBeforeMd5", "Digest nonce=a, algorithm=SHA-256, Digest nonce=b", "SHA-256"},
     {"FirstSupportedNotStrongest", "Digest nonce=b, Digest nonce=a, algorithm=SHA-256", "MD5"},
     {"UnsupportedSkipped",
      "Digest nonce=a, algorithm=SHA3-256, Digest nonce=b, qop=auth, algorithm=SHA-512-256-sess",
      "SHA-512-256-sess"},
     {"DigestAfterBasic", "Basic realm=x, Digest realm=x, nonce=a, algorithm=SHA-256", "SHA-256"},
-    {"DigestBeforeBasic", "Digest realm=x, nonce=a, algorithm=MD5-sess, qop=auth, Basic",
-     "MD5-sess"},
     {"SchemesAndNamesIgnoreCase", "DIGEST NONCE=a, Algorithm=sha-512-256", "SHA-512-256"},
     {"BasicWhenNoDigestCanBeAnswered", "Digest nonce=a, algorithm=SHA3-256, Basic realm=x",
      "Basic"},
@@ -186,41 +144,28 @@ const Choice CHOICES[] = {
      ""},
     {"CarriageReturnInRealm", QByteArray("Digest nonce=a, realm=\"x\ry\""), ""},
     {"LineFeedInNonce", QByteArray("Digest nonce=\"a\nb\""), ""},
-    {"NulInOpaque", bytes("Digest nonce=a, opaque=\"x\0y\""), ""},
+    {"NulInOpaque", "Digest nonce=a, opaque=\"x" + QByteArray(1, '\0') + "y\"", ""},
     {"EscapedLineFeed", "Digest nonce=\"a\\\nb\"", ""},
     {"DeleteInRealm", "Digest nonce=a, realm=\"x\x7fy\"", ""},
-    {"HugeField", "Digest nonce=a, " + repeated("parameter%d=\"xxxxxxxx\"", 10000), ""},
 };
 
-void PrintTo(const Choice& row, std::ostream* out) {
-    printRow(row, out);
-}
+TEST(WendrelAuthTest, ChoosesTheFirstSupportedDigestAndRefusesMalformedFields) {
+    for (const Choice& row : CHOICES) {
+        SCOPED_TRACE(row.name);
+        const std::optional<WendrelChallenge> chosen = WendrelChallenge::choose(row.challenges);
+        std::string said;
+        if (chosen)
+            said = chosen->scheme == WendrelChallenge::Scheme::Basic
+                       ? "Basic"
+                       : chosen->algorithmName().toStdString();
+        EXPECT_EQ(said, row.chosen);
 
-class WendrelChallengeChoiceTest : public ::testing::TestWithParam<Choice> {};
-
-TEST_P(WendrelChallengeChoiceTest, ChoosesTheFirstSupportedDigestAndRefusesMalformedFields) {
-    const Choice& row = GetParam();
-    const std::optional<WendrelChallenge> chosen = WendrelChallenge::choose(row.challenges);
-    std::string said;
-    if (chosen)
-        said = chosen->scheme == WendrelChallenge::Scheme::Basic
-                   ? "Basic"
-                   : chosen->algorithmName().toStdString();
-    EXPECT_EQ(said, row.chosen);
-
-    WendrelAuth auth;
-    const WendrelAuth::Answer answer =
-        auth.answer(ORIGIN, row.challenges, "GET", "/", MUFASA, CIRCLE, false);
-    EXPECT_EQ(answer.refusal, *row.chosen ? Refusal::None : Refusal::Unanswerable);
-    EXPECT_EQ(answer.authorization.isEmpty(), !*row.chosen);
-    EXPECT_EQ(auth.cacheBytes() == 0, !*row.chosen);
-}
-
-INSTANTIATE_TEST_SUITE_P(Choices, WendrelChallengeChoiceTest, ::testing::ValuesIn(CHOICES),
-                         [](const auto& info) { return std::string(info.param.name); });
-
-bool hasLineBreakOrNul(const QByteArray& value) {
-    return value.contains('\r') || value.contains('\n') || value.contains('\0');
+        WendrelAuth auth;
+        const WendrelAuth::Answer answer =
+            auth.answer(ORIGIN, row.challenges, "GET", "/", MUFASA, CIRCLE, false);
+        EXPECT_EQ(answer.refusal, *row.chosen ? Refusal::None : Refusal::Unanswerable);
+        EXPECT_EQ(answer.authorization.isEmpty() && auth.cacheBytes() == 0, !*row.chosen);
+    }
 }
 
 struct Hostile {
@@ -234,77 +179,53 @@ struct Hostile {
 const Hostile HOSTILE[] = {
     {"UserNameWithLineBreaks", "Digest nonce=a", "admin\"\r\n\r\nGET /x HTTP/1.1\r\nX: ", "/",
      "username*=UTF-8''admin%22%0D%0A%0D%0AGET%20%2Fx%20HTTP%2F1.1%0D%0AX%3A%20,"},
-    {"UserNameWithNul", "Digest nonce=a", QString::fromLatin1("a\0b", 3), "/",
-     "username*=UTF-8''a%00b,"},
-    {"UserNameWithLineBreaksHashed", "Digest nonce=a, qop=auth, userhash=true", "a\r\nb", "/",
-     "userhash=true"},
     {"BasicUserNameWithLineBreaks", "Basic", "a\r\nb", "/", "Basic YQ0KYjpDaXJjbGUgb2YgTGlmZQ=="},
     {"TargetWithLineBreak", "Digest nonce=a", MUFASA, "/a\r\nX: y", ""},
-    {"RealmWithLineBreak", "Digest nonce=a, realm=\"r\r\nX: y\"", MUFASA, "/", ""},
-    {"OpaqueWithNul", bytes("Digest nonce=a, opaque=\"\0\""), MUFASA, "/", ""},
 };
 
-void PrintTo(const Hostile& row, std::ostream* out) {
-    printRow(row, out);
-}
-
-class WendrelAuthHostileTest : public ::testing::TestWithParam<Hostile> {};
-
 // Whatever the server or the caller gives, no header value holds CR, LF or NUL.
-TEST_P(WendrelAuthHostileTest, NeverPutsLineBreaksOrNulInTheHeader) {
-    const Hostile& row = GetParam();
-    WendrelAuth auth;
-    const WendrelAuth::Answer answer =
-        auth.answer(ORIGIN, row.challenges, "GET", row.target, row.user, CIRCLE, false);
-    EXPECT_FALSE(hasLineBreakOrNul(answer.authorization));
-    const QByteArray next = auth.before(ORIGIN, "GET", row.target, row.user, CIRCLE);
-    EXPECT_FALSE(hasLineBreakOrNul(next));
-    if (*row.contains) {
-        EXPECT_EQ(answer.refusal, Refusal::None);
-        EXPECT_TRUE(answer.authorization.contains(row.contains)) << answer.authorization.data();
-        EXPECT_FALSE(next.isEmpty());
-    } else {
-        EXPECT_EQ(answer.refusal, Refusal::Unanswerable);
-        EXPECT_TRUE(answer.authorization.isEmpty() && next.isEmpty());
+TEST(WendrelAuthTest, NeverPutsLineBreaksOrNulInTheHeader) {
+    for (const Hostile& row : HOSTILE) {
+        SCOPED_TRACE(row.name);
+        WendrelAuth auth;
+        const WendrelAuth::Answer answer =
+            auth.answer(ORIGIN, row.challenges, "GET", row.target, row.user, CIRCLE, false);
+        const QByteArray next = auth.before(ORIGIN, "GET", row.target, row.user, CIRCLE);
+        for (const QByteArray& value : {answer.authorization, next})
+            EXPECT_FALSE(value.contains('\r') || value.contains('\n') || value.contains('\0'));
+        EXPECT_EQ(answer.refusal, *row.contains ? Refusal::None : Refusal::Unanswerable);
+        EXPECT_EQ(answer.authorization.contains(row.contains) && !next.isEmpty(),
+                  *row.contains != 0)
+            << answer.authorization.data();
     }
 }
 
-INSTANTIATE_TEST_SUITE_P(Hostile, WendrelAuthHostileTest, ::testing::ValuesIn(HOSTILE),
-                         [](const auto& info) { return std::string(info.param.name); });
-
+// An answer goes out in advance for the same credentials at the same origin only, counting on. A
+// stale nonce is no rejection: the new one is answered with the same credentials, counting afresh.
 TEST(WendrelAuthTest, AnswersInAdvanceOnlyTheSameCredentialsAtTheSameOrigin) {
     WendrelAuth auth;
-    EXPECT_TRUE(auth.before(ORIGIN, "GET", "/a", MUFASA, CIRCLE).isEmpty());
+    const auto before = [&auth](const QString& origin = ORIGIN, const QString& password = CIRCLE) {
+        return auth.before(origin, "GET", "/b", MUFASA, password);
+    };
+    EXPECT_TRUE(before().isEmpty());
     const WendrelAuth::Answer first =
-        auth.answer(ORIGIN, rfcChallenge("SHA-256"), "GET", "/a", MUFASA, CIRCLE, false);
+        auth.answer(ORIGIN, "Digest nonce=old, qop=auth", "GET", "/a", MUFASA, CIRCLE, false);
     EXPECT_EQ(first.scheme, "Digest");
-    EXPECT_TRUE(first.authorization.contains("nc=00000001")) << first.authorization.data();
+    EXPECT_TRUE(
+        first.authorization.contains("uri=\"/a\", algorithm=MD5, nonce=\"old\", nc=00000001"))
+        << first.authorization.data();
+    EXPECT_TRUE(before().contains("uri=\"/b\", algorithm=MD5, nonce=\"old\", nc=00000002"));
+    EXPECT_TRUE(before(ORIGIN, "other").isEmpty());
+    EXPECT_TRUE(before("http cam 81").isEmpty());
 
-    const QByteArray next = auth.before(ORIGIN, "GET", "/b", MUFASA, CIRCLE);
-    EXPECT_TRUE(next.contains("uri=\"/b\"") && next.contains("nc=00000002")) << next.data();
-    EXPECT_TRUE(auth.before(ORIGIN, "GET", "/b", MUFASA, "other").isEmpty());
-    EXPECT_TRUE(auth.before("http cam 81", "GET", "/b", MUFASA, CIRCLE).isEmpty());
-
-    auth.forget(ORIGIN, MUFASA, CIRCLE);
-    EXPECT_TRUE(auth.before(ORIGIN, "GET", "/b", MUFASA, CIRCLE).isEmpty());
-    EXPECT_EQ(auth.cacheBytes(), 0);
-}
-
-// A stale nonce is no rejection: the new nonce is answered with the same credentials, counting
-// afresh.
-TEST(WendrelAuthTest, StaleNonceAnsweredWithTheNewNonce) {
-    WendrelAuth auth;
-    auth.answer(ORIGIN, "Digest nonce=old, qop=auth", "GET", "/", MUFASA, CIRCLE, false);
-    auth.accepted(ORIGIN, MUFASA, CIRCLE);
-    EXPECT_TRUE(auth.before(ORIGIN, "GET", "/", MUFASA, CIRCLE).contains("nc=00000002"));
     const WendrelAuth::Answer renewed = auth.answer(
-        ORIGIN, "Digest nonce=new, qop=auth, stale=true", "GET", "/", MUFASA, CIRCLE, false);
+        ORIGIN, "Digest nonce=new, qop=auth, stale=true", "GET", "/a", MUFASA, CIRCLE, false);
     EXPECT_TRUE(renewed.authorization.contains("nonce=\"new\", nc=00000001"))
         << renewed.authorization.data();
-    const QByteArray next = auth.before(ORIGIN, "GET", "/", MUFASA, CIRCLE);
-    EXPECT_TRUE(next.contains("nonce=\"new\", nc=00000002")) << next.data();
-    EXPECT_EQ(auth.answer(ORIGIN, "Basic", "GET", "/", MUFASA, CIRCLE, false).refusal,
-              Refusal::Downgrade);
+    EXPECT_TRUE(before().contains("nonce=\"new\", nc=00000002")) << before().data();
+    auth.forget(ORIGIN, MUFASA, CIRCLE);
+    EXPECT_TRUE(before().isEmpty());
+    EXPECT_EQ(auth.cacheBytes(), 0);
 }
 
 TEST(WendrelAuthTest, BasicRefusedOverPlainHttpOnceDigestWorked) {
@@ -315,17 +236,18 @@ TEST(WendrelAuthTest, BasicRefusedOverPlainHttpOnceDigestWorked) {
         return auth.answer(https ? "https cam 443" : ORIGIN, challenges, "GET", "/", MUFASA,
                            password, https);
     };
-    // Answered, but never confirmed: no memory of it yet.
+    const auto before = [&auth] { return auth.before(ORIGIN, "GET", "/", MUFASA, CIRCLE); };
+    // Digest answered but not yet accepted, and Basic answered for a request meanwhile: once
+    // Digest is accepted, Basic is not sent in advance, nor answered.
     answer(digest, CIRCLE);
     EXPECT_EQ(answer("Basic", CIRCLE).refusal, Refusal::None);
-
-    answer(digest, CIRCLE);
+    EXPECT_TRUE(before().startsWith("Basic "));
     auth.accepted(ORIGIN, MUFASA, CIRCLE);
+    EXPECT_TRUE(before().isEmpty());
     const WendrelAuth::Answer refused = answer("Basic realm=x", CIRCLE);
     EXPECT_EQ(refused.refusal, Refusal::Downgrade);
     EXPECT_EQ(refused.scheme, "Basic");
-    EXPECT_TRUE(refused.authorization.isEmpty());
-    EXPECT_TRUE(auth.before(ORIGIN, "GET", "/", MUFASA, CIRCLE).isEmpty());
+    EXPECT_TRUE(refused.authorization.isEmpty() && before().isEmpty());
     // Digest is still answered; rejected credentials do not lose the memory.
     EXPECT_EQ(answer(digest + ", Basic", CIRCLE).scheme, "Digest");
     auth.forget(ORIGIN, MUFASA, CIRCLE);
@@ -337,17 +259,6 @@ TEST(WendrelAuthTest, BasicRefusedOverPlainHttpOnceDigestWorked) {
     EXPECT_EQ(answer("Basic", CIRCLE, true).refusal, Refusal::None);
 }
 
-// Basic answered for a second request while the first, carrying Digest, was under way: once the
-// Digest one is accepted, Basic is not sent in advance.
-TEST(WendrelAuthTest, DigestAcceptedDropsBasicAnsweredMeanwhile) {
-    WendrelAuth auth;
-    auth.answer(ORIGIN, "Digest nonce=a", "GET", "/", MUFASA, CIRCLE, false);
-    auth.answer(ORIGIN, "Basic", "GET", "/", MUFASA, CIRCLE, false);
-    EXPECT_TRUE(auth.before(ORIGIN, "GET", "/", MUFASA, CIRCLE).startsWith("Basic "));
-    auth.accepted(ORIGIN, MUFASA, CIRCLE);
-    EXPECT_TRUE(auth.before(ORIGIN, "GET", "/", MUFASA, CIRCLE).isEmpty());
-}
-
 // Resident memory in bytes, 0 where it cannot be read.
 qint64 residentBytes() {
     QFile file(QStringLiteral("/proc/self/statm"));
@@ -357,18 +268,6 @@ qint64 residentBytes() {
     return fields.size() > 1 ? fields[1].toLongLong() * 4096 : 0;
 }
 
-#if defined(__SANITIZE_ADDRESS__)
-const bool SANITIZED = true;
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer)
-const bool SANITIZED = true;
-#else
-const bool SANITIZED = false;
-#endif
-#else
-const bool SANITIZED = false;
-#endif
-
 // Many user names, each challenged with the largest challenge kept: the cache stays within its
 // bound, dropping the least recently used; a larger challenge is refused and leaves nothing.
 TEST(WendrelAuthTest, CacheStaysWithinItsBytesUnderManyUsersAndHugeChallenges) {
@@ -377,7 +276,7 @@ TEST(WendrelAuthTest, CacheStaysWithinItsBytesUnderManyUsersAndHugeChallenges) {
                                repeated("p%d=xxxxxxxx", 27);
     const QByteArray huge = largest + ", " + repeated("parameter%d=\"xxxxxxxx\"", 4000);
     const int users = 5000;
-    const qint64 residentBefore = residentBytes();
+    [[maybe_unused]] const qint64 residentBefore = residentBytes();
     WendrelAuth auth;
     for (int i = 0; i < users; ++i) {
         const QString user = "user" + QString::number(i);
@@ -393,10 +292,13 @@ TEST(WendrelAuthTest, CacheStaysWithinItsBytesUnderManyUsersAndHugeChallenges) {
     EXPECT_FALSE(
         auth.before(ORIGIN, "GET", "/", "user" + QString::number(users - 1), CIRCLE).isEmpty());
     EXPECT_TRUE(auth.before(ORIGIN, "GET", "/", "user1", CIRCLE).isEmpty());
-    // With the allocator's slack; an unbounded cache would hold 5,000 x 1.9 KiB here.
-    if (!SANITIZED && residentBefore > 0) {
-        EXPECT_LT(residentBytes() - residentBefore, 3 * WendrelAuth::maxCacheBytes);
+    // With the allocator's slack (1.3 MiB is held here): an unbounded cache would hold 5,000 x
+    // 1.9 KiB, and one that counted the nonce alone 2.6 MiB.
+#ifndef QUENVAR_ASAN
+    if (residentBefore > 0) {
+        EXPECT_LT(residentBytes() - residentBefore, 2 * WendrelAuth::maxCacheBytes);
     }
+#endif
 }
 
 // The memory of where Digest worked is bounded too: the oldest goes first.
@@ -417,6 +319,68 @@ TEST(WendrelAuthTest, DigestMemoryBounded) {
 TEST(WendrelAuthTest, TargetAsQtSendsIt) {
     EXPECT_EQ(WendrelAuth::target(QUrl("http://cam:81/a/b.cgi?x=%26&y#f")), "/a/b.cgi?x=%26&y");
     EXPECT_EQ(WendrelAuth::target(QUrl("http://cam?q")), "/?q");
+}
+
+// Wendrel against a server that checks every answer itself, with Python's hashlib.
+const QString PASSWORD = QStringLiteral("s3cret, or \"not\"?");
+// Three requests in turn: the first is challenged, the others answer in advance.
+const QString PATHS[] = {"/a", "/cgi-bin/b.cgi?x=%26&y", "/c"};
+
+struct Exchange {
+    const char* name;
+    const char* serverArguments; // joined by spaces
+    QString user;
+    QString password;     // the client's
+    const char* errors;   // of the three requests, joined by spaces
+    const char* verdicts; // the server's, one per request it received, joined by "; "
+};
+
+const char* const PASSED = "NoError NoError NoError";
+
+const Exchange EXCHANGES[] = {
+    // The first Digest challenge that can be answered, over Basic, for a name not in ASCII.
+    {"Sha256UsernameStar", "--offer SHA3-256,SHA-256,MD5,Basic", JASON, PASSWORD, PASSED,
+     "none; ok SHA-256 username*; ok SHA-256 username*; ok SHA-256 username*"},
+    {"Sha512_256Userhash", "--offer SHA-512-256 --userhash", JASON, PASSWORD, PASSED,
+     "none; ok SHA-512-256 userhash; ok SHA-512-256 userhash; ok SHA-512-256 userhash"},
+    // Each nonce serves one request: the next is answered afresh, not refused.
+    {"StaleSessionNonce", "--offer SHA-256-sess --nonce-uses 1", MUFASA, PASSWORD, PASSED,
+     "none; ok SHA-256-sess username; digest stale; ok SHA-256-sess username; "
+     "digest stale; ok SHA-256-sess username"},
+    // After Digest worked over plain HTTP, the server asks for Basic: never sent.
+    {"DowngradeRefused", "--offer SHA-256,Basic --basic-after-digest", MUFASA, PASSWORD,
+     "NoError AuthenticationRequiredError AuthenticationRequiredError",
+     "none; ok SHA-256 username; digest unasked SHA-256; none"},
+    {"WrongPassword", "--offer MD5", MUFASA, "wrong",
+     "AuthenticationRequiredError AuthenticationRequiredError AuthenticationRequiredError",
+     "none; digest wrong; none; digest wrong; none; digest wrong"},
+};
+
+TEST(DigestInteropTest, ServerAcceptsWhatItShould) {
+    for (const Exchange& row : EXCHANGES) {
+        SCOPED_TRACE(row.name);
+        QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
+        environment.insert(QStringLiteral("PYTHONUTF8"), QStringLiteral("1")); // the user's name
+        ListeningProcess server;
+        ASSERT_TRUE(server.start(
+            QStringLiteral(QUENVAR_PYTHON3),
+            QStringList{QStringLiteral(DIGEST_SERVER), "--user", row.user, "--password", PASSWORD} +
+                QString::fromLatin1(row.serverArguments).split(' '),
+            environment))
+            << qPrintable(server.errorOutput());
+        ReplyRecorder recorder;
+        Wendrel client(WendrelSettings{});
+        for (int i = 0; i < 3; ++i) {
+            ASSERT_TRUE(client.Get("127.0.0.1", PATHS[i], server.port(), false, row.user,
+                                   row.password, recorder.callback(i), 10000, {}));
+            ASSERT_TRUE(recorder.waitFor(i + 1, 10000));
+        }
+        QStringList errors;
+        for (const std::string& error : recorder.said(false))
+            errors << QString::fromStdString(error);
+        EXPECT_EQ(errors.join(' ').toStdString(), row.errors);
+        EXPECT_EQ(server.errorOutput().trimmed().replace('\n', "; ").toStdString(), row.verdicts);
+    }
 }
 
 } // namespace

@@ -12,22 +12,8 @@ using Reader = WendrelResponseReader;
 
 const qint64 MAX_HEADER = 1024;
 const qint64 MAX_BODY = 64;
-
-std::string failureName(Reader::Failure failure) {
-    switch (failure) {
-    case Reader::Failure::None:
-        return "none";
-    case Reader::Failure::HeadersTooLarge:
-        return "headers too large";
-    case Reader::Failure::BodyTooLarge:
-        return "body too large";
-    case Reader::Failure::Malformed:
-        return "malformed";
-    case Reader::Failure::EndedEarly:
-        return "ended early";
-    }
-    return "?";
-}
+const char* const FAILURES[] = {"none", "headers too large", "body too large", "malformed",
+                                "ended early"};
 
 // The answer in one line: what the client acts on and hands to the caller. How much of a
 // malformed or oversized header the reader took before it stopped depends on the split, and is
@@ -37,7 +23,7 @@ std::string described(Reader& reader, qsizetype used, qsizetype size) {
     const bool complete = reader.state() == Reader::State::Complete;
     std::string text = complete ? "complete"
                        : reader.state() == Reader::State::Failed
-                           ? "failed: " + failureName(reader.failure())
+                           ? "failed: " + std::string(FAILURES[int(reader.failure())])
                            : "reading";
     if (answer.status != 0)
         text += " | " + std::to_string(answer.status) + ' ' + answer.reason.toStdString();
@@ -111,16 +97,15 @@ INSTANTIATE_TEST_SUITE_P(
              "Basic realm=\"t\";Location: /x; | body abcde | keep-alive"},
         Case{"Http10UntilClose", "HTTP/1.0 200 OK\r\nServer: old\r\n\r\nall of it", true,
              "complete | 200 OK | Server: old; | body all of it | close"},
-        Case{"Http10KeepAlive",
-             "HTTP/1.0 200 OK\r\nConnection: keep-alive\r\nContent-Length: 1\r\n\r\nk", false,
-             "complete | 200 OK | Connection: keep-alive;Content-Length: 1; | body k | "
-             "keep-alive"},
+        // With the interim answers skipped; HTTP/1.0 kept alive, with bare line feeds.
         Case{"InterimThenFinal",
              "HTTP/1.1 100 Continue\r\nX-Interim: 1\r\n\r\nHTTP/1.1 102 Processing\r\n\r\n"
-             "HTTP/1.1 201 Created\r\nContent-Length: 1\r\n\r\nz",
-             false, "complete | 201 Created | Content-Length: 1; | body z | keep-alive"},
-        Case{"BareLineFeeds", "HTTP/1.1 200 OK\nContent-Length: 2\nX-B: 2\n\nok", false,
-             "complete | 200 OK | Content-Length: 2;X-B: 2; | body ok | keep-alive"},
+             "HTTP/1.1 204 No Content\r\n\r\n",
+             false, "complete | 204 No Content |  | body  | keep-alive"},
+        Case{
+            "BareLineFeeds", "HTTP/1.0 200 OK\nConnection: keep-alive\nContent-Length: 2\n\nok",
+            false,
+            "complete | 200 OK | Connection: keep-alive;Content-Length: 2; | body ok | keep-alive"},
         Case{"ChallengesAndLocation",
              "HTTP/1.1 401 Unauthorized\r\nWWW-Authenticate: Digest realm=\"r\", nonce=\"n\"\r\n"
              "www-authenticate: Basic realm=\"r\"\r\nLocation: /there\r\nContent-Length: 0\r\n\r\n",
@@ -129,11 +114,6 @@ INSTANTIATE_TEST_SUITE_P(
              "www-authenticate: Basic realm=\"r\";Location: /there;Content-Length: 0; | "
              "challenges Digest realm=\"r\", nonce=\"n\", Basic realm=\"r\" | location /there | "
              "body  | keep-alive"},
-        Case{"NoBodyForNoContent", "HTTP/1.1 204 No Content\r\n\r\n", false,
-             "complete | 204 No Content |  | body  | keep-alive"},
-        Case{"ConnectionClose",
-             "HTTP/1.1 200 OK\r\nConnection: close\r\nContent-Length: 1\r\n\r\nc", false,
-             "complete | 200 OK | Connection: close;Content-Length: 1; | body c | close"},
         Case{"BytesBeyondTheAnswerAreLeft",
              "HTTP/1.1 200 OK\r\nContent-Length: 1\r\n\r\naHTTP/1.1 200 OK\r\n\r\n", false,
              "complete | 200 OK | Content-Length: 1; | body a | keep-alive | 19 bytes left"},
@@ -157,8 +137,6 @@ INSTANTIATE_TEST_SUITE_P(
              "complete | 200 OK | Content-Length: 64; | body " + std::string(64, 'x') +
                  " | keep-alive"},
         Case{"NotAStatusLine", "HTTP/9 banana\r\n\r\n", true, "failed: malformed"},
-        Case{"BadChunkSize", "HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\nzz\r\n", false,
-             "failed: malformed | 200 OK"},
         Case{"NoSwitchingProtocols",
              "HTTP/1.1 101 Switching Protocols\r\nUpgrade: x\r\nConnection: upgrade\r\n\r\n", false,
              "failed: malformed"},

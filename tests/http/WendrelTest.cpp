@@ -1,16 +1,11 @@
 #include "Wendrel.h"
 
-#include "BuildPaths.h"
 #include "CamsimProcess.h"
-#include "EventLoopWait.h"
 #include "ReplyRecorder.h"
+#include "TestCertificate.h"
 #include "WendrelWorker.h"
 
 #include <QElapsedTimer>
-#include <QHostAddress>
-#include <QProcess>
-#include <QTcpServer>
-#include <QTcpSocket>
 #include <QTemporaryDir>
 
 #include <gmock/gmock.h>
@@ -199,137 +194,48 @@ TEST_F(WendrelTest, CallsFromSeveralThreadsAreEachAnsweredOnce) {
     EXPECT_THAT(camsim->logLines(), UnorderedElementsAreArray(logged));
 }
 
+// Each client reads the environment as it is made. A pinned certificate is trusted as the
+// identity of the camera that presents it, whatever name the camera was reached by, and vouches
+// for nothing else; a CA file's certificate vouches for what it signed.
 TEST_F(WendrelTest, CertificatesAreVerifiedUnlessTrusted) {
     QTemporaryDir folder;
-    const QString certificate = folder.filePath(QStringLiteral("cert.pem"));
-    const QString key = folder.filePath(QStringLiteral("key.pem"));
-    ASSERT_EQ(QProcess::execute("openssl",
-                                {"req", "-x509", "-newkey", "ec", "-pkeyopt",
-                                 "ec_paramgen_curve:prime256v1", "-nodes", "-days", "2", "-subj",
-                                 "/CN=127.0.0.1", "-addext", "subjectAltName=IP:127.0.0.1",
-                                 "-keyout", key, "-out", certificate}),
-              0)
-        << "openssl could not make a test certificate";
-    startCamsim({"--tls-cert", certificate, "--tls-key", key});
-
-    // Each client reads the environment as it is made.
-    const std::pair<const char*, QString> environments[] = {{"WENDREL_TLS_INSECURE", "0"},
-                                                            {"WENDREL_TLS_INSECURE", "yes"},
-                                                            {"WENDREL_TLS_INSECURE", "1"},
-                                                            {"WENDREL_CA_FILE", certificate}};
-    for (int id = 0; id < 4; ++id) {
-        qputenv(environments[id].first, environments[id].second.toLocal8Bit());
-        Wendrel client;
-        qunsetenv(environments[id].first);
-        client.Get(CamsimProcess::host(), GETPARAM, camsim->port(), true, {}, {},
-                   recorder.callback(id), TIMEOUT_MS, {});
-        ASSERT_TRUE(recorder.waitFor(id + 1));
-    }
-
-    const std::string refused = "SslHandshakeFailedError unreached";
-    EXPECT_EQ(recorder.said(), (Said{refused, refused, IDLE, IDLE}));
-    EXPECT_EQ(camsim->logLines().size(), 2u);
-}
-
-// A pinned certificate is trusted as the identity of the camera that presents it, whatever name
-// the camera was reached by, and vouches for nothing else; a CA file's certificate vouches for
-// what it signed.
-TEST_F(WendrelTest, APinnedCertificateIsTrustedAsItselfOnly) {
-    QTemporaryDir folder;
-    const auto path = [&folder](const char* name) { return folder.filePath(name); };
-    const auto openssl = [](const QStringList& arguments) {
-        return QProcess::execute("openssl", arguments) == 0;
+    ASSERT_TRUE(makeTestCertificate(folder.path(), "camera-7") &&
+                makeTestCertificate(folder.path(), "issued", "camera-7"));
+    const auto serving = [&folder](const QString& name) {
+        return QStringList{"--tls-cert", folder.filePath(name + ".pem"), "--tls-key",
+                           folder.filePath(name + ".key")};
     };
-    // The camera's own self-signed certificate, named otherwise than the address used; and one
-    // that its key signed for that address.
-    ASSERT_TRUE(
-        openssl({"req", "-x509", "-newkey", "ec", "-pkeyopt", "ec_paramgen_curve:prime256v1",
-                 "-nodes", "-days", "2", "-subj", "/CN=camera-7", "-keyout", path("pinned.key"),
-                 "-out", path("pinned.pem")}));
-    ASSERT_TRUE(openssl({"req", "-new", "-newkey", "ec", "-pkeyopt", "ec_paramgen_curve:prime256v1",
-                         "-nodes", "-subj", "/CN=127.0.0.1", "-keyout", path("issued.key"), "-out",
-                         path("issued.csr")}));
-    QFile extensions(path("issued.ext"));
-    ASSERT_TRUE(extensions.open(QIODevice::WriteOnly) &&
-                extensions.write("subjectAltName=IP:127.0.0.1\n") > 0);
-    extensions.close();
-    ASSERT_TRUE(openssl({"x509", "-req", "-in", path("issued.csr"), "-CA", path("pinned.pem"),
-                         "-CAkey", path("pinned.key"), "-CAcreateserial", "-days", "2", "-extfile",
-                         path("issued.ext"), "-out", path("issued.pem")}));
-    const CamsimProcess pinnedCamera(
-        {"--tls-cert", path("pinned.pem"), "--tls-key", path("pinned.key")});
-    const CamsimProcess issuedCamera(
-        {"--tls-cert", path("issued.pem"), "--tls-key", path("issued.key")});
-    ASSERT_NE(pinnedCamera.port(), 0) << qPrintable(pinnedCamera.error());
-    ASSERT_NE(issuedCamera.port(), 0) << qPrintable(issuedCamera.error());
+    const CamsimProcess selfSigned(serving("camera-7"));
+    const CamsimProcess issued(serving("issued"));
+    ASSERT_TRUE(selfSigned.port() && issued.port())
+        << qPrintable(selfSigned.error() + issued.error());
 
+    const QString pinned = folder.filePath("camera-7.pem");
     const struct {
+        const char* variable;
+        QString value;
         const CamsimProcess& camera;
-        const char* pins;
-        const char* caFile;
-        const char* said;
+        bool trusted;
     } rows[] = {
-        {pinnedCamera, "pinned.pem", "", IDLE.c_str()},
-        {issuedCamera, "pinned.pem", "", "SslHandshakeFailedError unreached"},
-        {pinnedCamera, "", "", "SslHandshakeFailedError unreached"},
-        {issuedCamera, "", "pinned.pem", IDLE.c_str()},
+        {"WENDREL_TLS_INSECURE", "0", selfSigned, false},
+        {"WENDREL_TLS_INSECURE", "yes", selfSigned, false},
+        {"WENDREL_TLS_INSECURE", "1", selfSigned, true},
+        {"WENDREL_PINNED_CERTS", pinned, selfSigned, true},
+        {"WENDREL_PINNED_CERTS", pinned, issued, false},
+        {"WENDREL_CA_FILE", pinned, issued, true},
     };
     Said expected;
-    int id = 0;
     for (const auto& row : rows) {
-        WendrelSettings settings;
-        settings.pinnedCertificatesFile = *row.pins ? path(row.pins) : QString();
-        settings.caFile = *row.caFile ? path(row.caFile) : QString();
-        Wendrel client(settings);
+        qputenv(row.variable, row.value.toLocal8Bit());
+        Wendrel client;
+        qunsetenv(row.variable);
         client.Get(CamsimProcess::host(), GETPARAM, row.camera.port(), true, {}, {},
-                   recorder.callback(id), TIMEOUT_MS, {});
-        ASSERT_TRUE(recorder.waitFor(++id));
-        expected.push_back(row.said);
+                   recorder.callback(int(expected.size())), TIMEOUT_MS, {});
+        expected.push_back(row.trusted ? IDLE : "SslHandshakeFailedError unreached");
+        ASSERT_TRUE(recorder.waitFor(int(expected.size())));
     }
     EXPECT_EQ(recorder.said(), expected);
-}
-
-// With few descriptors to spare, many cameras one after another: idle connections to earlier
-// cameras are closed to make room, so that every request succeeds.
-TEST(WendrelLimitTest, ManyCamerasWithFewDescriptors) {
-    // Every loopback address reaches it: each address is a camera of its own.
-    QTcpServer server;
-    ASSERT_TRUE(server.listen(QHostAddress::AnyIPv4, 0));
-    QObject::connect(&server, &QTcpServer::newConnection, &server, [&server] {
-        while (QTcpSocket* socket = server.nextPendingConnection()) {
-            QObject::connect(socket, &QTcpSocket::readyRead, socket, [socket] {
-                if (socket->readAll().contains("\r\n\r\n"))
-                    socket->write("HTTP/1.1 200 OK\r\nContent-Length: 2\r\n\r\nok");
-            });
-            QObject::connect(socket, &QTcpSocket::disconnected, socket, &QObject::deleteLater);
-        }
-    });
-    QProcess probe;
-    probe.start(BuildPaths::bin(QStringLiteral("wendrel-limit-probe")),
-                {QString::number(server.serverPort()), QStringLiteral("1000")});
-    ASSERT_TRUE(
-        runEventLoopUntil([&probe] { return probe.state() == QProcess::NotRunning; }, 120000));
-    EXPECT_EQ(probe.exitStatus(), QProcess::NormalExit);
-    EXPECT_EQ(probe.exitCode(), 0) << probe.readAllStandardOutput().constData();
-}
-
-TEST_F(WendrelTest, UnreachableAddressesAreAnsweredOnceWithoutReachingAServer) {
-    QTcpServer closed;
-    ASSERT_TRUE(closed.listen(QHostAddress::LocalHost, 0));
-    const quint16 port = closed.serverPort();
-    closed.close();
-    {
-        Wendrel client;
-        client.Get(CamsimProcess::host(), "/", port, false, {}, {}, recorder.callback(0),
-                   TIMEOUT_MS, {});
-        client.Get("ftp://127.0.0.1/x", {}, {}, recorder.callback(1), TIMEOUT_MS);
-        client.Get({}, "/x", 0, false, {}, {}, recorder.callback(2), TIMEOUT_MS, {});
-        ASSERT_TRUE(recorder.waitFor(3));
-    }
-
-    EXPECT_EQ(recorder.said(),
-              (Said{"ConnectionRefusedError unreached", "ProtocolUnknownError unreached",
-                    "HostNotFoundError unreached"}));
+    EXPECT_EQ(selfSigned.logLines().size() + issued.logLines().size(), 3u);
 }
 
 } // namespace
