@@ -77,17 +77,25 @@ QByteArray liveRequestLine(const QByteArray& camera) {
     return "GetVCARules\t<GetVCARules><Cam>" + camera + "</Cam></GetVCARules>";
 }
 
+// The first group of each match of pattern in text, one line each.
+QStringList captured(const QString& pattern, const QString& text) {
+    QStringList found;
+    QRegularExpressionMatchIterator matches =
+        QRegularExpression(pattern, QRegularExpression::MultilineOption).globalMatch(text);
+    while (matches.hasNext())
+        found << matches.next().captured(1);
+    return found;
+}
+
 // Each event of a stream as its name and its data, without the data's time stamp, which must be
 // set.
 QStringList eventsOf(EventStream& stream) {
     QStringList events;
-    QRegularExpressionMatchIterator found =
-        QRegularExpression("\nevent: (\\S+)\ndata: ([^\n]*)\n").globalMatch(stream.read());
-    while (found.hasNext()) {
-        const QRegularExpressionMatch event = found.next();
-        QJsonObject data = QJsonDocument::fromJson(event.captured(2).toUtf8()).object();
+    for (const QString& event : captured("\n(event: .*\ndata: .*)$", stream.read())) {
+        QJsonObject data = QJsonDocument::fromJson(event.section("\ndata: ", 1).toUtf8()).object();
         EXPECT_GT(data.take("timestamp").toDouble(), 0);
-        events << event.captured(1) + " " + QJsonDocument(data).toJson(QJsonDocument::Compact);
+        events << event.section('\n', 0, 0).mid(7) + " " +
+                      QJsonDocument(data).toJson(QJsonDocument::Compact);
     }
     return events;
 }
@@ -210,8 +218,7 @@ TEST_F(HostEndToEndTest, AnswersOverBothFronts) {
 TEST_F(HostEndToEndTest, ServesPluginsAndEventsToAFullSetOfStreams) {
     ASSERT_TRUE(writeFile(vcaPath("live/cam1.xml"), liveRules("cam1", "{\"sensitivity\":80}")));
     ASSERT_TRUE(startServe({"--verbose"})) << qPrintable(serve.errorOutput());
-    const ServedHost::Reply plugins = serve.exchange({ServedHost::message(
-        "GET /api/plugins HTTP/1.1", {serve.hostField(), serve.tokenField()})})[0];
+    const ServedHost::Reply plugins = serve.get("/api/plugins");
     EXPECT_EQ(plugins.status, 200);
     const QByteArray entries =
         R"([{"IID":"com.MERIDOX.PluginServer.PluginInterface","className":"PluginQuenvar",)"
@@ -242,9 +249,7 @@ TEST_F(HostEndToEndTest, ServesPluginsAndEventsToAFullSetOfStreams) {
     ASSERT_TRUE(
         runEventLoopUntil([&] { return reading(": subscribed", 1) == MAX_EVENT_STREAMS; }, WAIT_MS))
         << reading(": subscribed", 1);
-    const QByteArray streamRequest = ServedHost::message("GET /api/events?subscriber=S0 HTTP/1.1",
-                                                         {serve.hostField(), serve.tokenField()});
-    const ServedHost::Reply refused = serve.exchange({streamRequest})[0];
+    const ServedHost::Reply refused = serve.get("/api/events?subscriber=S0");
     EXPECT_EQ(refused.status, 503);
     EXPECT_TRUE(refused.json()["error"].isString());
     const ServedHost::Reply answer =
@@ -298,13 +303,8 @@ TEST_F(HostEndToEndTest, ServesPluginsAndEventsToAFullSetOfStreams) {
     EXPECT_EQ(lines(eventsOf(*streams[0]) + eventsOf(*streams[1]) + eventsOf(*streams[2])),
               lines(expected));
     // The host subscribes with the first stream of each and unsubscribes with the last.
-    QStringList subscriptions;
-    QRegularExpressionMatchIterator found =
-        QRegularExpression("PluginHost\\.cpp:\\d+ (\\S*subscribing [ABC])$",
-                           QRegularExpression::MultilineOption)
-            .globalMatch(serve.errorOutput());
-    while (found.hasNext())
-        subscriptions << found.next().captured(1);
+    QStringList subscriptions =
+        captured("PluginHost\\.cpp:\\d+ (\\S*subscribing [ABC])$", serve.errorOutput());
     subscriptions.sort();
     EXPECT_EQ(lines(subscriptions),
               lines({"subscribing A", "subscribing B", "subscribing C", "unsubscribing C"}));
@@ -339,14 +339,8 @@ TEST_F(HostEndToEndTest, SkipsPluginsItCannotUseAndAnswersWithoutTheVcaPlugin) {
                         livePayload("", false, EMPTY_XML_RULES, "") + "}")
                   .toStdString());
     // The host's failures, at the logging library's default level, without file and line.
-    QStringList warnings;
-    const QRegularExpression failure(
-        QStringLiteral(R"(\[QuenvarHost\] L2 platform/host/\S+ (.*))"));
-    for (const QString& line : run.errors.split('\n')) {
-        const QRegularExpressionMatch match = failure.match(line);
-        if (match.hasMatch())
-            warnings << match.captured(1).section(" (", 0, 0);
-    }
+    QStringList warnings =
+        captured(R"(\[QuenvarHost\] L2 platform/host/\S+ (.*?)( \(.*)?$)", run.errors);
     EXPECT_EQ(lines(warnings),
               lines({"skipping libBroken.so: not a Qt plugin",
                      "skipping libForeignPlugin.so: its interface is "

@@ -173,11 +173,7 @@ TEST_F(HttpFrontTest, CutsOffSlowAndIdleConnectionsAndBoundsThem) {
     EXPECT_LE(most, descriptors + MAX_CONNECTIONS + 4);
 
     idle.clear();
-    EXPECT_EQ(serve
-                  .exchange({ServedHost::message("GET /api/plugins HTTP/1.1",
-                                                 {serve.hostField(), serve.tokenField()})})[0]
-                  .status,
-              200);
+    EXPECT_EQ(serve.get("/api/plugins").status, 200);
     EXPECT_EQ(serve.stop(), 0) << qPrintable(serve.errorOutput());
 }
 
@@ -204,16 +200,8 @@ TEST(HttpFrontTokenTest, PrintsOnlyAMadeTokenAndWritesTheFileForTheOwnerOnly) {
         ASSERT_EQ(::stat(QFile::encodeName(file).constData(), &status), 0);
         EXPECT_EQ(status.st_mode & 0777, 0600u);
 
-        const auto statusWith = [&serve](const QByteArray& token) {
-            return serve
-                .exchange(
-                    {ServedHost::message("GET /api/plugins HTTP/1.1",
-                                         {serve.hostField(), "Authorization: Bearer " + token})})
-                .first()
-                .status;
-        };
-        EXPECT_EQ(statusWith(token), 200);
-        EXPECT_EQ(statusWith(ServedHost::TOKEN), 401);
+        EXPECT_EQ(serve.get("/api/plugins", token).status, 200);
+        EXPECT_EQ(serve.get("/api/plugins", ServedHost::TOKEN).status, 401);
         EXPECT_EQ(serve.stop(), 0) << qPrintable(serve.errorOutput());
         EXPECT_TRUE(serve.readLine(0).isNull());
         EXPECT_FALSE(!given.isNull() && serve.errorOutput().contains(given));

@@ -109,6 +109,12 @@ QList<ServedHost::Reply> ServedHost::post(const QList<QByteArray>& bodies) const
     return exchange(messages);
 }
 
+ServedHost::Reply ServedHost::get(const QByteArray& target, const QByteArray& withToken) const {
+    return exchange({message("GET " + target + " HTTP/1.1",
+                             {hostField(), "Authorization: Bearer " + withToken})})
+        .first();
+}
+
 EventStream::EventStream(const ServedHost& host, const QByteArray& subscriber) {
     socket.connectToHost(QHostAddress::LocalHost, host.port());
     socket.write(ServedHost::message("GET /api/events?subscriber=" + subscriber + " HTTP/1.1",

@@ -37,6 +37,9 @@ public:
     QList<Reply> exchange(const QList<QByteArray>& messages) const;
     // Posts every body to /api/request at once, with the token.
     QList<Reply> post(const QList<QByteArray>& bodies) const;
+    // GET of target with the token, or with the given one.
+    Reply get(const QByteArray& target) const { return get(target, token); }
+    Reply get(const QByteArray& target, const QByteArray& withToken) const;
 
 private:
     QByteArray token;
