@@ -4,7 +4,7 @@
 set -euo pipefail
 cd "$(dirname "$0")"
 
-# cpp-httplib: the simulated camera and the tests' clients; libmicrohttpd: quenvar-host serve;
+# cpp-httplib: the simulated camera; libmicrohttpd: quenvar-host serve;
 # python3: the Digest server the tests check answers against.
 PACKAGES=(cmake ninja-build g++ pkg-config ccache openssl qt6-base-dev libgtest-dev libgmock-dev
     libcpp-httplib-dev libssl-dev rapidjson-dev libhttp-parser-dev libmicrohttpd-dev python3)

@@ -1,17 +1,14 @@
 #include "camera/CameraProxy.h"
 
-#include "CamsimProcess.h"
+#include "AnsweringHttpClient.h"
 #include "PluginQuenvarDefs.h"
 
 #include <QDebug>
 
 #include <gtest/gtest.h>
 
-#include <chrono>
-#include <condition_variable>
 #include <functional>
 #include <memory>
-#include <mutex>
 #include <utility>
 #include <vector>
 
@@ -39,16 +36,8 @@ std::string outcome(int calls, bool success, const QVariant& result = QVariant()
     return text.toStdString();
 }
 
-// How an operation completed, on whatever thread: how often, and the last outcome.
+// How often an operation completed, and the last outcome.
 struct Completion {
-    std::string wait() {
-        std::unique_lock<std::mutex> lock(mutex);
-        done.wait_for(lock, std::chrono::seconds(15), [this] { return calls > 0; });
-        return text;
-    }
-
-    std::mutex mutex;
-    std::condition_variable done;
     int calls = 0;
     std::string text = outcome(0, false);
 };
@@ -58,9 +47,7 @@ std::shared_ptr<Completion> start(Operation operation, ICameraProxy& proxy,
     auto completion = std::make_shared<Completion>();
     // Fits every completion callback: the flag, then nothing, a map, a variant or a list.
     const auto record = [completion](bool ok, const auto&... result) {
-        const std::lock_guard<std::mutex> lock(completion->mutex);
         completion->text = outcome(++completion->calls, ok, QVariant(result...));
-        completion->done.notify_all();
     };
     const std::function<void()> operations[] = {
         [&] { proxy.getPTZIdleAction(params, record); },
@@ -76,10 +63,12 @@ std::shared_ptr<Completion> start(Operation operation, ICameraProxy& proxy,
     return completion;
 }
 
-// Records every call as one line of all its arguments and holds its reply callback until the test
-// answers it. Only the host forms of Get and Post are expected.
-class RecordingHttpClient : public ISimpleHTTPClient {
+// Records every call of the host forms of Get and Post, which are all the proxy uses, as one line
+// of all its arguments, and holds its reply callback until the test answers it.
+class RecordingHttpClient : public AnsweringHttpClient {
 public:
+    RecordingHttpClient()
+        : AnsweringHttpClient(nullptr) {}
     // Answers what is still pending, as a real client does when it goes.
     ~RecordingHttpClient() override { answerAll(QNetworkReply::OperationCanceledError); }
 
@@ -98,6 +87,8 @@ public:
         }
     }
 
+    using AnsweringHttpClient::Get;
+    using AnsweringHttpClient::Post;
     bool Get(const QString& host, const QString& path, quint16 port, bool useSSL,
              const QString& user, const QString& password, HttpReplyCallback callback, uint timeout,
              const QStringList& headers) override {
@@ -109,26 +100,6 @@ public:
               HttpReplyCallback callback, uint timeout) override {
         return record("POST " + path + ' ' + contentType + ' ' + QString::fromLatin1(body), host,
                       port, useSSL, user, password, timeout, std::move(callback));
-    }
-    bool Get(const QString&, const QString&, const QString&, HttpReplyCallback, uint) override {
-        return unexpected();
-    }
-    bool Post(const QString&, const QByteArray&, const QString&, const QString&, const QString&,
-              HttpReplyCallback, uint, const QStringList&) override {
-        return unexpected();
-    }
-    bool PostWithOAuth(const QString&, const QByteArray&, const QString&, quint16, bool,
-                       const QString&, const QString&, const QString&, HttpReplyCallback,
-                       uint) override {
-        return unexpected();
-    }
-    bool Delete(const QString&, const QByteArray&, const QString&, quint16, bool, const QString&,
-                const QString&, const QString&, HttpReplyCallback, uint) override {
-        return unexpected();
-    }
-    bool Put(const QString&, const QByteArray&, const QString&, quint16, bool, const QString&,
-             const QString&, const QString&, HttpReplyCallback, uint) override {
-        return unexpected();
     }
 
     std::vector<std::string> calls;
@@ -145,11 +116,6 @@ private:
         return true;
     }
 
-    bool unexpected() {
-        ADD_FAILURE() << "only the host forms of Get and Post are expected";
-        return false;
-    }
-
     std::vector<HttpReplyCallback> replies;
 };
 
@@ -157,13 +123,13 @@ const QString CAMCTRL = QStringLiteral("/cgi-bin/camctrl/camctrl.cgi");
 const QString SETPARAM = QStringLiteral("/cgi-bin/admin/setparam.cgi");
 const QString STOP = CAMCTRL + "?vx=0&vy=0&vs=0&zoom=stop&zs=0&auto=stop";
 const QByteArray RATIO_ANSWER = "zoom=2\nmaxratio=20\n";
+const QByteArray IDLE_ANSWER = "camctrl_c0_idleaction_enable='1'\n"
+                               "camctrl_c0_idleaction_type='objtrack'\n"
+                               "camctrl_c0_idleaction_interval='30'\n";
 
 QVariantMap cameraParams(const QVariantMap& extra = QVariantMap()) {
-    QVariantMap params{{KEY_HOST, QStringLiteral("10.1.2.3")},
-                       {KEY_PORT, 8443},
-                       {KEY_USE_SSL, true},
-                       {KEY_USER, QStringLiteral("admin")},
-                       {KEY_PASS, QStringLiteral("s3cret&x=1")}};
+    QVariantMap params{{"host", "10.1.2.3"}, {"port", 8443},         {"useSSL", true},
+                       {"user", "admin"},    {"pass", "s3cret&x=1"}, {"nodeID", "node-7"}};
     params.insert(extra);
     return params;
 }
@@ -185,6 +151,14 @@ std::string post(const QString& path, const QString& body, const QString& connec
 QString idleForm(const QString& enabled, const QString& interval) {
     return "camctrl_c0_idleaction_enable=" + enabled +
            "&camctrl_c0_idleaction_type=objtrack&camctrl_c0_idleaction_interval=" + interval;
+}
+
+QByteArray idleAnswer(const QByteArray& from, const QByteArray& to) {
+    return QByteArray(IDLE_ANSWER).replace(from, to);
+}
+
+QVariantMap tracking(const char* type) {
+    return {{"type", QString::fromUtf8(type)}, {"nodeID", "node-7"}};
 }
 
 template <typename Row>
@@ -218,36 +192,90 @@ TEST_P(CameraProxyRequestTest, SendsExactlyTheRequestDescribed) {
     EXPECT_EQ(completion->text, outcome(1, true));
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Requests, CameraProxyRequestTest,
-    ::testing::Values(RequestRow{"StopWithoutConnectionParameters", Operation::Stop, QVariantMap(),
-                                 get(STOP, QStringLiteral(":0 http : 10000"))},
-                      RequestRow{"PortAsText", Operation::SetTrackingType,
-                                 cameraParams({{KEY_PORT, "8080"}}),
-                                 post(CAMCTRL, "ptztrack=setAutoTracking", camera(8080))},
-                      RequestRow{"PortHighest", Operation::Stop, cameraParams({{KEY_PORT, 65535}}),
-                                 get(STOP, camera(65535))},
-                      RequestRow{"SetIdleAction", Operation::SetIdleAction,
-                                 cameraParams({{KEY_ENABLED, "1"}, {KEY_INTERVAL, 60}}),
-                                 post(SETPARAM, idleForm("1", "60"))},
-                      RequestRow{"SetIdleActionWithoutValues", Operation::SetIdleAction,
-                                 cameraParams(), post(SETPARAM, idleForm("", ""))},
-                      // Latin-1 bytes, each percent-encoded, and a question mark for each UTF-16
-                      // unit beyond Latin-1.
-                      RequestRow{"SetIdleActionLatin1Values", Operation::SetIdleAction,
-                                 cameraParams({{KEY_ENABLED, QString::fromUtf16(u"\u00e9&x=1")},
-                                               {KEY_INTERVAL, QString::fromUtf16(u"6\u00ff0")}}),
-                                 post(SETPARAM, idleForm("%E9%26x%3D1", "6%FF0"))},
-                      RequestRow{"SetIdleActionBeyondLatin1", Operation::SetIdleAction,
-                                 cameraParams({{KEY_ENABLED, QString::fromUtf16(u"\u20ac")},
-                                               {KEY_INTERVAL, QString::fromUtf16(u"\U0001F600")}}),
-                                 post(SETPARAM, idleForm("%3F", "%3F%3F"))},
-                      RequestRow{"SetTrackingIsCaseSensitive", Operation::SetTrackingType,
-                                 cameraParams({{KEY_TYPE, "SmartTracking"}}),
-                                 post(CAMCTRL, "ptztrack=setAutoTracking")},
-                      RequestRow{"SetTrackingWithoutType", Operation::SetTrackingType,
-                                 cameraParams(), post(CAMCTRL, "ptztrack=setAutoTracking")}),
-    rowName<RequestRow>);
+const RequestRow REQUEST_ROWS[] = {
+    {"StopWithoutConnectionParameters", Operation::Stop, {}, get(STOP, ":0 http : 10000")},
+    {"PortAsText", Operation::SetTrackingType, cameraParams({{"port", "8080"}}),
+     post(CAMCTRL, "ptztrack=setAutoTracking", camera(8080))},
+    {"PortHighest", Operation::Stop, cameraParams({{"port", 65535}}), get(STOP, camera(65535))},
+    {"SetIdleAction", Operation::SetIdleAction, cameraParams({{"enabled", "1"}, {"interval", 60}}),
+     post(SETPARAM, idleForm("1", "60"))},
+    {"SetIdleActionWithoutValues", Operation::SetIdleAction, cameraParams(),
+     post(SETPARAM, idleForm("", ""))},
+    // Latin-1 bytes, each percent-encoded, and a question mark for each UTF-16 unit beyond.
+    {"SetIdleActionLatin1Values", Operation::SetIdleAction,
+     cameraParams({{"enabled", QString::fromUtf16(u"\u00e9&x=1")},
+                   {"interval", QString::fromUtf16(u"6\u00ff0")}}),
+     post(SETPARAM, idleForm("%E9%26x%3D1", "6%FF0"))},
+    {"SetIdleActionBeyondLatin1", Operation::SetIdleAction,
+     cameraParams({{"enabled", QString::fromUtf16(u"\u20ac")},
+                   {"interval", QString::fromUtf16(u"\U0001F600")}}),
+     post(SETPARAM, idleForm("%3F", "%3F%3F"))},
+    {"SetTrackingIsCaseSensitive", Operation::SetTrackingType,
+     cameraParams({{"type", "SmartTracking"}}), post(CAMCTRL, "ptztrack=setAutoTracking")},
+    {"SetTrackingWithoutType", Operation::SetTrackingType, cameraParams(),
+     post(CAMCTRL, "ptztrack=setAutoTracking")},
+};
+
+INSTANTIATE_TEST_SUITE_P(Requests, CameraProxyRequestTest, ::testing::ValuesIn(REQUEST_ROWS),
+                         rowName<RequestRow>);
+
+struct AnswerRow {
+    const char* name;
+    Operation operation;
+    QByteArray answer;
+    QVariant result;
+    Error outcome = QNetworkReply::NoError;
+};
+
+using CameraProxyAnswerTest = CameraProxyTable<AnswerRow>;
+
+TEST_P(CameraProxyAnswerTest, DeliversWhatTheAnswerHolds) {
+    const AnswerRow& row = GetParam();
+    QVariantMap params = cameraParams();
+    const auto completion = start(row.operation, proxy, params);
+    // The node goes back as it was when the operation started.
+    params.insert("nodeID", "later");
+    client->answer(0, row.outcome, row.answer);
+
+    EXPECT_EQ(completion->text, outcome(1, row.outcome == QNetworkReply::NoError, row.result));
+}
+
+const AnswerRow ANSWER_ROWS[] = {
+    {"IdleOtherTypeReadsAsDisabled", Operation::GetIdleAction, idleAnswer("'objtrack'", "'x'"),
+     QVariantMap{{"enabled", "0"}, {"interval", "30"}}},
+    {"IdleTwoDigitFlagIsIgnored", Operation::GetIdleAction, idleAnswer("enable='1'", "enable='12'"),
+     QVariantMap{{"interval", "30"}}},
+    {"IdleEmptyIntervalIsIgnored", Operation::GetIdleAction, idleAnswer("'30'", "''"),
+     QVariantMap{{"enabled", "1"}}},
+    {"IdleTypeWithoutFlag", Operation::GetIdleAction,
+     idleAnswer("camctrl_c0_idleaction_enable='1'\n", ""), QVariantMap{{"interval", "30"}}},
+    {"IdleFailureStillParsed", Operation::GetIdleAction, IDLE_ANSWER,
+     QVariantMap{{"enabled", "1"}, {"interval", "30"}}, QNetworkReply::ContentAccessDenied},
+    {"TrackingKeepsAllAfterTheFirstEquals", Operation::GetTrackingType, "a=b=c \t",
+     tracking("b=c")},
+    {"TrackingBlankAfterEquals", Operation::GetTrackingType, "type= \n", tracking("")},
+    {"TrackingFailureStillParsed", Operation::GetTrackingType, "type=smarttracking",
+     tracking("smarttracking"), QNetworkReply::TimeoutError},
+    {"PresetsWithARuleInOrder", Operation::GetPresetList,
+     R"({"Other":1,"PresetInfo":[{"Name":"A","HasRule":true},{"Name":"B","HasRule":false},
+        {"Name":"C","HasRule":1},{"Name":"D","HasRule":"1"},{"Name":"E","HasRule":"0"},
+        {"Name":"F","HasRule":0},{"Name":"G"},{"Name":"H","HasRule":"false"},
+        {"Name":"Y","HasRule":"yes"},{"Name":7,"HasRule":true},{"Name":"A","HasRule":true}]})",
+     QStringList{"A", "C", "D", "Y", "7", "A"}},
+    {"PresetWithoutName", Operation::GetPresetList, R"({"PresetInfo":[{"HasRule":true}]})",
+     QStringList{""}},
+    {"PresetsNotJson", Operation::GetPresetList, "<html>PresetInfo</html>", QStringList()},
+    {"PresetsFailureIgnoresTheBody", Operation::GetPresetList,
+     R"({"PresetInfo":[{"Name":"A","HasRule":true}]})", QStringList(),
+     QNetworkReply::AuthenticationRequiredError},
+    {"GotoPresetAnswerText", Operation::GotoPreset, "OK caf\xc3\xa9\n",
+     QString::fromUtf16(u"OK caf\u00e9\n")},
+    {"GotoPresetFailureText", Operation::GotoPreset, "no such preset",
+     QStringLiteral("no such preset"), QNetworkReply::ContentNotFoundError},
+};
+
+INSTANTIATE_TEST_SUITE_P(Answers, CameraProxyAnswerTest, ::testing::ValuesIn(ANSWER_ROWS),
+                         rowName<AnswerRow>);
 
 struct FailureRow {
     const char* name;
@@ -276,24 +304,26 @@ TEST_P(CameraProxyFailureTest, FailsOnceAtAnyStepAndOnAnUnaddressablePort) {
     for (const QVariant& port :
          {QVariant(65536), QVariant(-1), QVariant("-1"), QVariant(qlonglong(65536 + 80)),
           QVariant("18446744073709551615")}) {
-        const auto refused = start(row.operation, proxy, cameraParams({{KEY_PORT, port}}));
+        const auto refused = start(row.operation, proxy, cameraParams({{"port", port}}));
         EXPECT_EQ(refused->text, outcome(1, false, row.result)) << qPrintable(port.toString());
     }
     EXPECT_EQ(client->calls.size(), sent);
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    AllOperations, CameraProxyFailureTest,
-    ::testing::Values(FailureRow{"GetIdleAction", Operation::GetIdleAction, QVariantMap()},
-                      FailureRow{"SetIdleAction", Operation::SetIdleAction, QVariant()},
-                      FailureRow{"GetTrackingType", Operation::GetTrackingType,
-                                 QVariantMap{{KEY_TYPE, "autotracking"}, {KEY_NODE_ID, QString()}}},
-                      FailureRow{"SetTrackingType", Operation::SetTrackingType, QVariant()},
-                      FailureRow{"Stop", Operation::Stop, QVariant()},
-                      FailureRow{"AreaZoom", Operation::AreaZoom, QVariant()},
-                      FailureRow{"GotoPreset", Operation::GotoPreset, QString()},
-                      FailureRow{"GetPresetList", Operation::GetPresetList, QStringList()}),
-    rowName<FailureRow>);
+const FailureRow FAILURE_ROWS[] = {
+    {"GetIdleAction", Operation::GetIdleAction, QVariantMap()},
+    {"SetIdleAction", Operation::SetIdleAction, QVariant()},
+    {"GetTrackingType", Operation::GetTrackingType,
+     QVariantMap{{"type", "autotracking"}, {"nodeID", "node-7"}}},
+    {"SetTrackingType", Operation::SetTrackingType, QVariant()},
+    {"Stop", Operation::Stop, QVariant()},
+    {"AreaZoom", Operation::AreaZoom, QVariant()},
+    {"GotoPreset", Operation::GotoPreset, QString()},
+    {"GetPresetList", Operation::GetPresetList, QStringList()},
+};
+
+INSTANTIATE_TEST_SUITE_P(AllOperations, CameraProxyFailureTest, ::testing::ValuesIn(FAILURE_ROWS),
+                         rowName<FailureRow>);
 
 struct ZoomRow {
     const char* name;
@@ -308,7 +338,7 @@ TEST_P(CameraProxyZoomTest, SetsTheRatioRoundedUpToTenthsAndHeldBelowTheMaximum)
     // Through a copy released at once, and with the caller's map emptied: what the later steps
     // need must travel with them, and the copy must send through the same client.
     auto copy = std::make_unique<CameraProxy>(proxy);
-    QVariantMap params = cameraParams({{KEY_ZOOM_RATIO, GetParam().zoomRatio}});
+    QVariantMap params = cameraParams({{"zoomRatio", GetParam().zoomRatio}});
     const auto completion = start(Operation::AreaZoom, *copy, params);
     copy.reset();
     params.clear();
@@ -322,136 +352,17 @@ TEST_P(CameraProxyZoomTest, SetsTheRatioRoundedUpToTenthsAndHeldBelowTheMaximum)
     EXPECT_EQ(completion->text, outcome(1, true));
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Ratios, CameraProxyZoomTest,
-    ::testing::Values(
-        ZoomRow{"RoundsUpToTenths", "zoom=1\nmaxratio=20", 2.34, "2.4"},
-        ZoomRow{"ProductJustAboveTenthsRoundsUp", "zoom=1.5\nmaxratio=20", 1.6, "2.5"},
-        ZoomRow{"WithinOneOfMaximumBecomesMaximum", "zoom=10\nmaxratio=20", 1.95, "20"},
-        ZoomRow{"ExactlyOneBelowMaximumIsKept", "zoom=1\nmaxratio=19.5", 18.5, "18.5"},
-        ZoomRow{"MissingMaximumHoldsAtOne", "zoom=2", 1.5, "1"},
-        ZoomRow{"MissingFactorGivesZero", RATIO_ANSWER, QVariant(), "0"},
-        ZoomRow{"SixSignificantDigits", "zoom=1\nmaxratio=1000000", 123456.7, "123457"}),
-    rowName<ZoomRow>);
-
-struct AnswerRow {
-    const char* name;
-    Operation operation;
-    QByteArray answer;
-    QVariant result;
-    Error outcome = QNetworkReply::NoError;
+const ZoomRow ZOOM_ROWS[] = {
+    {"RoundsUpToTenths", "zoom=1\nmaxratio=20", 2.34, "2.4"},
+    {"ProductJustAboveTenthsRoundsUp", "zoom=1.5\nmaxratio=20", 1.6, "2.5"},
+    {"WithinOneOfMaximumBecomesMaximum", "zoom=10\nmaxratio=20", 1.95, "20"},
+    {"ExactlyOneBelowMaximumIsKept", "zoom=1\nmaxratio=19.5", 18.5, "18.5"},
+    {"MissingMaximumHoldsAtOne", "zoom=2", 1.5, "1"},
+    {"MissingFactorGivesZero", RATIO_ANSWER, QVariant(), "0"},
+    {"SixSignificantDigits", "zoom=1\nmaxratio=1000000", 123456.7, "123457"},
 };
 
-using CameraProxyAnswerTest = CameraProxyTable<AnswerRow>;
-
-TEST_P(CameraProxyAnswerTest, DeliversWhatTheAnswerHolds) {
-    const AnswerRow& row = GetParam();
-    QVariantMap params = cameraParams({{KEY_NODE_ID, "node-7"}});
-    const auto completion = start(row.operation, proxy, params);
-    // The node goes back as it was when the operation started.
-    params.insert(KEY_NODE_ID, QStringLiteral("later"));
-
-    client->answer(0, row.outcome, row.answer);
-
-    EXPECT_EQ(completion->text, outcome(1, row.outcome == QNetworkReply::NoError, row.result));
-}
-
-const QByteArray IDLE_ANSWER = "camctrl_c0_idleaction_enable='1'\n"
-                               "camctrl_c0_idleaction_type='objtrack'\n"
-                               "camctrl_c0_idleaction_interval='30'\n";
-
-QByteArray idleAnswer(const QByteArray& from, const QByteArray& to) {
-    return QByteArray(IDLE_ANSWER).replace(from, to);
-}
-
-QVariantMap tracking(const char* type) {
-    return {{KEY_TYPE, QString::fromUtf8(type)}, {KEY_NODE_ID, QStringLiteral("node-7")}};
-}
-
-INSTANTIATE_TEST_SUITE_P(
-    Answers, CameraProxyAnswerTest,
-    ::testing::Values(
-        AnswerRow{"IdleOtherTypeReadsAsDisabled", Operation::GetIdleAction,
-                  idleAnswer("'objtrack'", "'preset'"),
-                  QVariantMap{{KEY_ENABLED, "0"}, {KEY_INTERVAL, "30"}}},
-        AnswerRow{"IdleTwoDigitFlagIsIgnored", Operation::GetIdleAction,
-                  idleAnswer("enable='1'", "enable='12'"), QVariantMap{{KEY_INTERVAL, "30"}}},
-        AnswerRow{"IdleEmptyIntervalIsIgnored", Operation::GetIdleAction, idleAnswer("'30'", "''"),
-                  QVariantMap{{KEY_ENABLED, "1"}}},
-        AnswerRow{"IdleTypeWithoutFlag", Operation::GetIdleAction,
-                  idleAnswer("camctrl_c0_idleaction_enable='1'\n", ""),
-                  QVariantMap{{KEY_INTERVAL, "30"}}},
-        AnswerRow{"IdleFailureStillParsed", Operation::GetIdleAction, IDLE_ANSWER,
-                  QVariantMap{{KEY_ENABLED, "1"}, {KEY_INTERVAL, "30"}},
-                  QNetworkReply::ContentAccessDenied},
-        AnswerRow{"TrackingKeepsAllAfterTheFirstEquals", Operation::GetTrackingType, "a=b=c \t",
-                  tracking("b=c")},
-        AnswerRow{"TrackingBlankAfterEquals", Operation::GetTrackingType, "type= \n", tracking("")},
-        AnswerRow{"TrackingFailureStillParsed", Operation::GetTrackingType, "type=smarttracking",
-                  tracking("smarttracking"), QNetworkReply::TimeoutError},
-        AnswerRow{"PresetsWithARuleInOrder", Operation::GetPresetList,
-                  R"({"Other":1,"PresetInfo":[{"Name":"A","HasRule":true},
-                      {"Name":"B","HasRule":false},{"Name":"C","HasRule":1},
-                      {"Name":"D","HasRule":"1"},{"Name":"E","HasRule":"0"},
-                      {"Name":"F","HasRule":0},{"Name":"G"},{"Name":"H","HasRule":"false"},
-                      {"Name":"Y","HasRule":"yes"},
-                      {"Name":7,"HasRule":true},{"Name":"A","HasRule":true}]})",
-                  QStringList{"A", "C", "D", "Y", "7", "A"}},
-        AnswerRow{"PresetWithoutName", Operation::GetPresetList,
-                  R"({"PresetInfo":[{"HasRule":true}]})", QStringList{""}},
-        AnswerRow{"PresetsNotJson", Operation::GetPresetList, "<html>PresetInfo</html>",
-                  QStringList()},
-        AnswerRow{"PresetsFailureIgnoresTheBody", Operation::GetPresetList,
-                  R"({"PresetInfo":[{"Name":"A","HasRule":true}]})", QStringList(),
-                  QNetworkReply::AuthenticationRequiredError},
-        AnswerRow{"GotoPresetAnswerText", Operation::GotoPreset, "OK caf\xc3\xa9\n",
-                  QStringLiteral("OK caf\u00e9\n")},
-        AnswerRow{"GotoPresetFailureText", Operation::GotoPreset, "no such preset",
-                  QStringLiteral("no such preset"), QNetworkReply::ContentNotFoundError}),
-    rowName<AnswerRow>);
-
-// The proxy with its own client against the simulated camera, with Digest authentication: what the
-// camera answers reaches the callback, and what is set takes effect.
-TEST(CameraProxyEndToEndTest, OperationsWorkAgainstTheSimulatedCamera) {
-    const QString password = QStringLiteral("p4ss:w&rd");
-    const CamsimProcess camsim({"--auth", "digest", "--user", "operator", "--pass", password});
-    ASSERT_NE(camsim.port(), 0) << qPrintable(camsim.error());
-    const struct {
-        Operation operation;
-        QVariantMap params;
-        std::string outcome;
-    } steps[] = {
-        {Operation::GetIdleAction,
-         {},
-         outcome(1, true, QVariantMap{{KEY_ENABLED, "0"}, {KEY_INTERVAL, "30"}})},
-        {Operation::SetTrackingType, {{KEY_TYPE, "smarttracking"}}, outcome(1, true)},
-        {Operation::GetTrackingType,
-         {{KEY_NODE_ID, "n"}},
-         outcome(1, true, QVariantMap{{KEY_TYPE, "smarttracking"}, {KEY_NODE_ID, "n"}})},
-        {Operation::AreaZoom,
-         {{KEY_ZOOM_CENTER_X, 320},
-          {KEY_ZOOM_CENTER_Y, 240},
-          {KEY_VIEW_CELL_WIDTH, 640},
-          {KEY_VIEW_CELL_HEIGHT, 480},
-          {KEY_RESOLUTION_WIDTH, 1920},
-          {KEY_RESOLUTION_HEIGHT, 1080},
-          {KEY_ZOOM_RATIO, 1.6}},
-         outcome(1, true)},
-        {Operation::Stop, {}, outcome(1, true)},
-    };
-    CameraProxy proxy;
-    for (const auto& step : steps) {
-        QVariantMap params{{KEY_HOST, CamsimProcess::host()},
-                           {KEY_PORT, camsim.port()},
-                           {KEY_USER, "operator"},
-                           {KEY_PASS, password}};
-        params.insert(step.params);
-        EXPECT_EQ(start(step.operation, proxy, params)->wait(), step.outcome);
-    }
-    EXPECT_EQ(camsim.state(),
-              R"({"center":{"resolution":"1920x1080","videosize":"640x480","x":320,"y":240},)"
-              R"("idleEnable":"0","idleInterval":"30","idleType":"objtrack","lastPreset":"",)"
-              R"("maxratio":20,"stopCount":1,"trackingType":"smarttracking","zoom":1.6})");
-}
+INSTANTIATE_TEST_SUITE_P(Ratios, CameraProxyZoomTest, ::testing::ValuesIn(ZOOM_ROWS),
+                         rowName<ZoomRow>);
 
 } // namespace

@@ -21,6 +21,7 @@
 
 #include <memory>
 #include <ostream>
+#include <utility>
 #include <vector>
 
 namespace {
@@ -96,13 +97,13 @@ TEST_P(CameraFaultTest, EveryCommandIsAnsweredOnceWithTheFailureResult) {
     QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
     environment.insert("QT_LOGGING_RULES", "qt.network.*=true");
     ServedHost host;
-    ASSERT_TRUE(host.serve({"--verbose"}, environment));
+    ASSERT_TRUE(host.serve({"--verbose"}, ServedHost::TOKEN, environment));
     // The same requests in this process too, where the answers can be counted.
     FakeFrameworkTools tools;
     auto plugin = std::make_unique<PluginQuenvar>();
     ASSERT_TRUE(plugin->InitialPluginBase(&tools));
     AnswerLedger ledger;
-    QList<QJsonObject> requests;
+    QList<QByteArray> requests;
     for (const CameraCommand& command : cameraCommands()) {
         const QVariantMap params = command.to(port, SECRET, c.camera == Camera::Tls);
         plugin->Request(command.name, params, RequestSenderInfo(),
@@ -110,7 +111,7 @@ TEST_P(CameraFaultTest, EveryCommandIsAnsweredOnceWithTheFailureResult) {
         requests.append(ServedHost::request(command.name, params));
     }
     // All at once: the ones that wait for the deadline wait together.
-    const QList<ServedHost::Answer> answers = host.post(requests);
+    const QList<ServedHost::Reply> answers = host.post(requests);
     ASSERT_TRUE(ledger.waitForAll(DEADLINE_MS + PROMPT_MS));
     plugin.reset();
 
@@ -120,11 +121,12 @@ TEST_P(CameraFaultTest, EveryCommandIsAnsweredOnceWithTheFailureResult) {
         SCOPED_TRACE(command.name);
         const AnswerLedger::Entry counted = ledger.entry(i);
         EXPECT_EQ(counted.calls, 1);
-        for (const ServedHost::Answer& answer :
-             {answers.at(i), ServedHost::Answer{200, counted.first, counted.elapsedMs}}) {
-            EXPECT_EQ(answer.status, 200);
+        EXPECT_EQ(answers.at(i).status, 200);
+        for (const auto& [json, elapsedMs] :
+             {std::pair(answers.at(i).json(), answers.at(i).elapsedMs),
+              std::pair(counted.first, counted.elapsedMs)}) {
             // Undefined: any text.
-            const QJsonValue payload = answer.json.value("payload");
+            const QJsonValue payload = json.value("payload");
             const QJsonObject expected{
                 {"handled", true},
                 {"code", "-1"},
@@ -132,11 +134,11 @@ TEST_P(CameraFaultTest, EveryCommandIsAnsweredOnceWithTheFailureResult) {
                 {"payload", command.failurePayload.isUndefined() && payload.isString()
                                 ? payload
                                 : command.failurePayload}};
-            const QByteArray json = QJsonDocument(answer.json).toJson(QJsonDocument::Compact);
-            everything += json;
-            EXPECT_EQ(answer.json, expected) << json.constData();
-            EXPECT_LT(answer.elapsedMs, c.waitsForDeadline ? DEADLINE_MS + PROMPT_MS : PROMPT_MS);
-            EXPECT_GE(answer.elapsedMs, c.waitsForDeadline ? DEADLINE_MS - 500 : 0);
+            const QByteArray text = QJsonDocument(json).toJson(QJsonDocument::Compact);
+            everything += text;
+            EXPECT_EQ(json, expected) << text.constData();
+            EXPECT_LT(elapsedMs, c.waitsForDeadline ? DEADLINE_MS + PROMPT_MS : PROMPT_MS);
+            EXPECT_GE(elapsedMs, c.waitsForDeadline ? DEADLINE_MS - 500 : 0);
         }
     }
     EXPECT_EQ(host.stop(), 0) << qPrintable(host.errorOutput());

@@ -1,31 +1,30 @@
 #include "BuildPaths.h"
 #include "CamsimProcess.h"
 #include "EventLoopWait.h"
-#include "ListeningProcess.h"
+#include "ServedHost.h"
 
 #include <QDir>
 #include <QFile>
 #include <QJsonDocument>
 #include <QJsonObject>
-#include <QNetworkAccessManager>
-#include <QNetworkReply>
 #include <QProcess>
 #include <QRegularExpression>
 #include <QTemporaryDir>
 
 #include <gtest/gtest.h>
-#include <httplib.h>
 
-#include <csignal>
+#include <algorithm>
 #include <cstdio>
 #include <memory>
+#include <vector>
 
 namespace {
 
 const QString QUENVAR_ID = QStringLiteral("4a6c7db2eaf84341b0a1e30507161c73");
 const QString VCA_ID = QStringLiteral("2F4484ECD91046658F567F2B3B0FDAFD");
-// serve's bearer token, given through the environment.
-const char TOKEN[] = "end-to-end-test-token";
+const int WAIT_MS = 20000;
+// What the front allows (HttpFront.h).
+const size_t MAX_EVENT_STREAMS = 256;
 const QString EMPTY_XML_RULES =
     QStringLiteral("<?xml version='1.0' encoding='UTF-8'?><Rules></Rules>");
 
@@ -78,45 +77,28 @@ QByteArray liveRequestLine(const QByteArray& camera) {
     return "GetVCARules\t<GetVCARules><Cam>" + camera + "</Cam></GetVCARules>";
 }
 
-// One subscriber's event stream of quenvar-host serve, read as the event loop runs.
-class EventStream {
-public:
-    EventStream(QNetworkAccessManager& network, quint16 port, const QString& subscriberId)
-        : reply(network.get(request(port, subscriberId))) {}
+// The first group of each match of pattern in text, one line each.
+QStringList captured(const QString& pattern, const QString& text) {
+    QStringList found;
+    QRegularExpressionMatchIterator matches =
+        QRegularExpression(pattern, QRegularExpression::MultilineOption).globalMatch(text);
+    while (matches.hasNext())
+        found << matches.next().captured(1);
+    return found;
+}
 
-    // Waits for the opening comment, which says the host has subscribed, or for events.
-    bool waitFor(const char* text, int times = 1) {
-        return runEventLoopUntil([this, text, times]() { return read().count(text) >= times; });
+// Each event of a stream as its name and its data, without the data's time stamp, which must be
+// set.
+QStringList eventsOf(EventStream& stream) {
+    QStringList events;
+    for (const QString& event : captured("\n(event: .*\ndata: .*)$", stream.read())) {
+        QJsonObject data = QJsonDocument::fromJson(event.section("\ndata: ", 1).toUtf8()).object();
+        EXPECT_GT(data.take("timestamp").toDouble(), 0);
+        events << event.section('\n', 0, 0).mid(7) + " " +
+                      QJsonDocument(data).toJson(QJsonDocument::Compact);
     }
-
-    // Each event as its name and its data, without the data's time stamp, which must be set.
-    QStringList events() {
-        QStringList events;
-        for (const QString& block : QString::fromUtf8(read()).split("\n\n")) {
-            const QStringList lines = block.split('\n');
-            if (!block.startsWith("event: ") || !lines.value(1).startsWith("data: "))
-                continue;
-            QJsonObject data = QJsonDocument::fromJson(lines[1].mid(6).toUtf8()).object();
-            EXPECT_GT(data.take("timestamp").toDouble(), 0);
-            events << lines[0].mid(7) + " " + QJsonDocument(data).toJson(QJsonDocument::Compact);
-        }
-        return events;
-    }
-
-private:
-    static QNetworkRequest request(quint16 port, const QString& subscriberId) {
-        QNetworkRequest request(QUrl(QStringLiteral("http://127.0.0.1:%1/api/events?subscriber=%2")
-                                         .arg(port)
-                                         .arg(subscriberId)));
-        request.setRawHeader("Authorization", QByteArray("Bearer ") + TOKEN);
-        return request;
-    }
-
-    const QByteArray& read() { return text += reply->readAll(); }
-
-    std::unique_ptr<QNetworkReply> reply;
-    QByteArray text;
-};
+    return events;
+}
 
 std::string lines(const QStringList& list) {
     return list.join('\n').toStdString();
@@ -124,20 +106,13 @@ std::string lines(const QStringList& list) {
 
 class HostEndToEndTest : public ::testing::Test {
 protected:
-    static void SetUpTestSuite() { std::signal(SIGPIPE, SIG_IGN); }
-
     QString vcaPath(const QString& name) const { return QDir(vca.path()).filePath(name); }
     bool startServe(const QStringList& extra = {}) {
-        QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
-        environment.insert("QUENVAR_HOST_TOKEN", TOKEN);
-        return serve.start(
-            BuildPaths::bin("quenvar-host"),
-            QStringList{"serve", "--listen", "127.0.0.1:0", "--vca-dir", vca.path()} + extra,
-            environment);
+        return serve.serve(QStringList{"--vca-dir", vca.path()} + extra);
     }
 
     QTemporaryDir vca;
-    ListeningProcess serve;
+    ServedHost serve;
 };
 
 // Rule commands and camera commands through quenvar-host to the simulated camera (Digest
@@ -186,8 +161,15 @@ TEST_F(HostEndToEndTest, AnswersOverBothFronts) {
          "GetRecordingVCARules\t<GetRecordingVCARules><QueryTime>1700000000</QueryTime>"
          "<Loc>loc-1</Loc><Loc>loc-2</Loc></GetRecordingVCARules>"},
         {"setPTZIdleAction", R"({CAMERA,"enabled":1,"interval":45})", "0", "null"},
+        {"retrievePTZIdleAction", "{CAMERA}", "0", R"({"enabled":"1","interval":"45"})"},
         {"retrievePTZTrackingType", R"({CAMERA,"nodeID":"node-7"})", "0",
          R"({"nodeID":"node-7","type":"autotracking"})"},
+        {"setPTZTrackingType", R"({CAMERA,"type":"smarttracking"})", "0", "null"},
+        {"areaZoom",
+         R"({CAMERA,"zoomCenterX":320,"zoomCenterY":240,"viewCellWidth":640,"viewCellHeight":480,)"
+         R"("resolutionWidth":1920,"resolutionHeight":1080,"zoomRatio":1.6})",
+         "0", "null"},
+        {"stopPTZMovement", "{CAMERA}", "0", "null"},
         {"gotoSmartTrackingAdvPreset", R"({CAMERA,"presetName":"Entrance"})", "0",
          R"("ptztrack_track='Entrance'\r\n")"},
         {"getSmartTrackingAdvPresetList", "{CAMERA}", "0", R"(["Entrance","Parking Lot"])"},
@@ -197,9 +179,6 @@ TEST_F(HostEndToEndTest, AnswersOverBothFronts) {
     QStringList answers;
     QStringList expected;
     QByteArray vcaLog;
-    httplib::Client client("127.0.0.1", serve.port());
-    client.set_bearer_token_auth(TOKEN);
-    client.set_read_timeout(60, 0);
     for (const auto& row : rows) {
         const QByteArray params = QByteArray(row.params).replace("CAMERA", connection);
         // Past runHost's patience: a request nothing can answer any more must end at once.
@@ -207,11 +186,10 @@ TEST_F(HostEndToEndTest, AnswersOverBothFronts) {
             {"request", "--vca-dir", vca.path(), "--timeout-ms", "600000", row.command, params});
         answers << row.command + " request " + QString::number(run.exitCode) + " " +
                        canonical(run.output);
-        const QByteArray body = "{\"command\":\"" + row.command + "\",\"params\":" + params + "}";
-        const httplib::Result result =
-            client.Post("/api/request", body.toStdString(), "application/json");
-        answers << row.command + " serve " + QString::number(result ? result->status : 0) + " " +
-                       canonical(result ? QByteArray::fromStdString(result->body) : QByteArray());
+        const ServedHost::Reply reply =
+            serve.post({"{\"command\":\"" + row.command + "\",\"params\":" + params + "}"})[0];
+        answers << row.command + " serve " + QString::number(reply.status) + " " +
+                       canonical(reply.body);
 
         const QString answer =
             row.payload.isEmpty()
@@ -228,55 +206,73 @@ TEST_F(HostEndToEndTest, AnswersOverBothFronts) {
     QFile logged(vcaPath("requests.log"));
     ASSERT_TRUE(logged.open(QIODevice::ReadOnly));
     EXPECT_EQ(logged.readAll().toStdString(), vcaLog.toStdString());
-    // The set commands of both fronts reached the camera.
-    const QJsonDocument state = QJsonDocument::fromJson(QByteArray::fromStdString(camera.state()));
-    EXPECT_EQ(state["idleInterval"].toString(), "45");
-    EXPECT_EQ(state["lastPreset"].toString(), "Entrance");
+    // The set commands of both fronts reached the camera; the second zoom multiplied the first.
+    EXPECT_EQ(
+        camera.state(),
+        R"({"center":{"resolution":"1920x1080","videosize":"640x480","x":320,"y":240},)"
+        R"("idleEnable":"1","idleInterval":"45","idleType":"objtrack","lastPreset":"Entrance",)"
+        R"("maxratio":20,"stopCount":2,"trackingType":"smarttracking","zoom":2.6})");
 }
 
-TEST_F(HostEndToEndTest, ServesPluginsAndEventsAndRejectsBadRequests) {
+// The plugin list, and events to a full set of streams beside requests.
+TEST_F(HostEndToEndTest, ServesPluginsAndEventsToAFullSetOfStreams) {
     ASSERT_TRUE(writeFile(vcaPath("live/cam1.xml"), liveRules("cam1", "{\"sensitivity\":80}")));
     ASSERT_TRUE(startServe({"--verbose"})) << qPrintable(serve.errorOutput());
-    httplib::Client client("127.0.0.1", serve.port());
-    client.set_bearer_token_auth(TOKEN);
-
-    QStringList statuses;
-    for (const char* body : {"", "nope", "[]", "{}", R"({"command":7})"}) {
-        const httplib::Result result = client.Post("/api/request", body, "application/json");
-        statuses << QString::number(result ? result->status : 0);
-    }
-    const httplib::Result noSubscriber = client.Get("/api/events");
-    statuses << QString::number(noSubscriber ? noSubscriber->status : 0);
-    EXPECT_EQ(lines(statuses), lines(QStringList(6, "400")));
-
-    const httplib::Result plugins = client.Get("/api/plugins");
-    ASSERT_TRUE(plugins);
-    EXPECT_EQ(plugins->status, 200);
+    const ServedHost::Reply plugins = serve.get("/api/plugins");
+    EXPECT_EQ(plugins.status, 200);
     const QByteArray entries =
         R"([{"IID":"com.MERIDOX.PluginServer.PluginInterface","className":"PluginQuenvar",)"
         R"("file":"libPluginQuenvar.so","metaData":{"PluginID":"QUENVAR"},"pluginId":"QUENVAR"},)"
         R"({"IID":"com.MERIDOX.PluginServer.PluginInterface","className":"PluginVcaSim",)"
         R"("file":"libPluginVcaSim.so","metaData":{"Commands":["GetVCARules",)"
         R"("GetRecordingVCARules"],"PluginID":"VCA"},"pluginId":"VCA"}])";
-    EXPECT_EQ(canonical(QByteArray::fromStdString(plugins->body)).toStdString(),
+    EXPECT_EQ(canonical(plugins.body).toStdString(),
               canonical(QByteArray(entries)
                             .replace("QUENVAR", QUENVAR_ID.toUtf8())
                             .replace("VCA\"", VCA_ID.toUtf8() + '"'))
                   .toStdString());
 
-    // C leaves before the changes, and so does one of B's two streams.
-    QNetworkAccessManager network;
-    EventStream a1(network, serve.port(), "A");
-    EventStream a2(network, serve.port(), "A");
-    EventStream b(network, serve.port(), "B");
-    {
-        EventStream leavingB(network, serve.port(), "B");
-        EventStream leavingC(network, serve.port(), "C");
-        for (EventStream* stream : {&a1, &a2, &b, &leavingB, &leavingC})
-            ASSERT_TRUE(stream->waitFor(": subscribed"));
-    }
+    // C leaves before the changes, and so does one of B's two streams; eight more subscribers fill
+    // the front's 256 streams, more than a thread per stream would allow.
+    std::vector<std::unique_ptr<EventStream>> streams;
+    for (const char* id : {"A", "A", "B", "B", "C"})
+        streams.push_back(std::make_unique<EventStream>(serve, id));
+    while (streams.size() < MAX_EVENT_STREAMS)
+        streams.push_back(
+            std::make_unique<EventStream>(serve, "S" + QByteArray::number(streams.size() % 8)));
+    // How many streams have received text at least times times.
+    const auto reading = [&streams](const char* text, int times) {
+        return static_cast<size_t>(std::count_if(streams.begin(), streams.end(), [&](auto& stream) {
+            return stream->read().count(text) >= times;
+        }));
+    };
+    ASSERT_TRUE(
+        runEventLoopUntil([&] { return reading(": subscribed", 1) == MAX_EVENT_STREAMS; }, WAIT_MS))
+        << reading(": subscribed", 1);
+    const ServedHost::Reply refused = serve.get("/api/events?subscriber=S0");
+    EXPECT_EQ(refused.status, 503);
+    EXPECT_TRUE(refused.json()["error"].isString());
+    const ServedHost::Reply answer =
+        serve.post({ServedHost::request("retrieveVcaRawRuleInfo", "cam1")})[0];
+    EXPECT_EQ(answer.json().value("payload")["camID"].toString(), "cam1")
+        << answer.body.constData();
+    for (const auto& stream : streams)
+        EXPECT_TRUE(stream->isOpen());
+
+    streams.erase(streams.begin() + 3, streams.begin() + 5);
     ASSERT_TRUE(
         runEventLoopUntil([this] { return serve.errorOutput().contains("unsubscribing C"); }));
+    // The places of streams that went are free again once the front notices.
+    EXPECT_TRUE(runEventLoopUntil(
+        [&] {
+            if (streams.size() < MAX_EVENT_STREAMS - 1)
+                streams.push_back(std::make_unique<EventStream>(serve, "S0"));
+            if (streams.back()->read().contains(" 503 "))
+                streams.pop_back();
+            return streams.size() == MAX_EVENT_STREAMS - 1 &&
+                   streams.back()->read().contains(": subscribed");
+        },
+        WAIT_MS));
     // A file replaced the way editors save (a new file renamed over it), changed again, and a new
     // one: each reaches every stream still open, once.
     const QString changed[] = {"cam1.new", "cam1.xml", "cam2.xml"};
@@ -290,8 +286,9 @@ TEST_F(HostEndToEndTest, ServesPluginsAndEventsAndRejectsBadRequests) {
                                   qPrintable(vcaPath("live/cam1.xml"))),
                       0);
         }
-        for (EventStream* stream : {&a1, &a2, &b})
-            ASSERT_TRUE(stream->waitFor("\nevent: ", i + 1));
+        ASSERT_TRUE(runEventLoopUntil([&] { return reading("\nevent: ", i + 1) == streams.size(); },
+                                      WAIT_MS))
+            << reading("\nevent: ", i + 1);
         events << livePayload(camera, true, R"({"Intrusion":{"Front door":)" + rule + "}}");
     }
     QStringList expected;
@@ -303,15 +300,11 @@ TEST_F(HostEndToEndTest, ServesPluginsAndEventsAndRejectsBadRequests) {
                                 QUENVAR_ID.toUtf8() + "\",\"subscriberId\":\"" + id +
                                 "\",\"eventData\":" + rules.toUtf8() + "}");
     }
-    EXPECT_EQ(lines(a1.events() + a2.events() + b.events()), lines(expected));
+    EXPECT_EQ(lines(eventsOf(*streams[0]) + eventsOf(*streams[1]) + eventsOf(*streams[2])),
+              lines(expected));
     // The host subscribes with the first stream of each and unsubscribes with the last.
-    QStringList subscriptions;
-    QRegularExpressionMatchIterator found =
-        QRegularExpression("PluginHost\\.cpp:\\d+ (\\S*subscribing \\S+)$",
-                           QRegularExpression::MultilineOption)
-            .globalMatch(serve.errorOutput());
-    while (found.hasNext())
-        subscriptions << found.next().captured(1);
+    QStringList subscriptions =
+        captured("PluginHost\\.cpp:\\d+ (\\S*subscribing [ABC])$", serve.errorOutput());
     subscriptions.sort();
     EXPECT_EQ(lines(subscriptions),
               lines({"subscribing A", "subscribing B", "subscribing C", "unsubscribing C"}));
@@ -346,14 +339,8 @@ TEST_F(HostEndToEndTest, SkipsPluginsItCannotUseAndAnswersWithoutTheVcaPlugin) {
                         livePayload("", false, EMPTY_XML_RULES, "") + "}")
                   .toStdString());
     // The host's failures, at the logging library's default level, without file and line.
-    QStringList warnings;
-    const QRegularExpression failure(
-        QStringLiteral(R"(\[QuenvarHost\] L2 platform/host/\S+ (.*))"));
-    for (const QString& line : run.errors.split('\n')) {
-        const QRegularExpressionMatch match = failure.match(line);
-        if (match.hasMatch())
-            warnings << match.captured(1).section(" (", 0, 0);
-    }
+    QStringList warnings =
+        captured(R"(\[QuenvarHost\] L2 platform/host/\S+ (.*?)( \(.*)?$)", run.errors);
     EXPECT_EQ(lines(warnings),
               lines({"skipping libBroken.so: not a Qt plugin",
                      "skipping libForeignPlugin.so: its interface is "

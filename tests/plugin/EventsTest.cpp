@@ -107,8 +107,8 @@ TEST_F(EventsTest, NothingIsDeliveredBeforeInitialisationOrAfterDestruction) {
     early.setVcaRuleRetriever(rules);
     early.SubscribeEventBlock("A", EVENT_LIVE_VCA_RULE_CHANGED, {}, {}, responser);
     early.handleVCAMetadataChanged("cam-1");
-    ASSERT_EQ(rules->liveCalls.size(), 1);
-    EXPECT_NO_THROW(rules->liveCalls[0].callback(true, "0", "", QVariant()));
+    ASSERT_EQ(rules->calls.size(), 1);
+    EXPECT_NO_THROW(rules->calls[0].callback(true, "0", "", QVariant()));
     subscribe("B");
     plugin->handleVCAMetadataChanged("cam-1");
     plugin.reset();

@@ -15,44 +15,38 @@
 class FakeCameraProxy : public ICameraProxy {
 public:
     struct Call {
-        QString operation;
-        QVariantMap params;
         std::function<void(bool, const QVariant&)> complete;
     };
 
-    void getPTZIdleAction(const QVariantMap& params,
+    void getPTZIdleAction(const QVariantMap&,
                           const std::function<void(bool, const QVariantMap&)>& callback) override {
-        record("getPTZIdleAction", params, callback);
+        record(callback);
     }
-    void setPTZIdleAction(const QVariantMap& params,
-                          const std::function<void(bool)>& callback) override {
-        record("setPTZIdleAction", params, callback);
+    void setPTZIdleAction(const QVariantMap&, const std::function<void(bool)>& callback) override {
+        record(callback);
     }
     void
-    getPTZTrackingType(const QVariantMap& params,
+    getPTZTrackingType(const QVariantMap&,
                        const std::function<void(bool, const QVariantMap&)>& callback) override {
-        record("getPTZTrackingType", params, callback);
+        record(callback);
     }
-    void setPTZTrackingType(const QVariantMap& params,
+    void setPTZTrackingType(const QVariantMap&,
                             const std::function<void(bool)>& callback) override {
-        record("setPTZTrackingType", params, callback);
+        record(callback);
     }
-    void stopPTZMovement(const QVariantMap& params,
-                         const std::function<void(bool)>& callback) override {
-        record("stopPTZMovement", params, callback);
+    void stopPTZMovement(const QVariantMap&, const std::function<void(bool)>& callback) override {
+        record(callback);
     }
-    void areaZoom(const QVariantMap& params, const std::function<void(bool)>& callback) override {
-        record("areaZoom", params, callback);
+    void areaZoom(const QVariantMap&, const std::function<void(bool)>& callback) override {
+        record(callback);
     }
     void gotoSmartTrackingAdvPreset(
-        const QVariantMap& params,
-        const std::function<void(bool, const QVariant&)>& callback) override {
-        record("gotoSmartTrackingAdvPreset", params, callback);
+        const QVariantMap&, const std::function<void(bool, const QVariant&)>& callback) override {
+        record(callback);
     }
     void getSmartTrackingAdvPresetList(
-        const QVariantMap& params,
-        const std::function<void(bool, QList<QString>)>& callback) override {
-        record("getSmartTrackingAdvPresetList", params, callback);
+        const QVariantMap&, const std::function<void(bool, QList<QString>)>& callback) override {
+        record(callback);
     }
 
     QList<Call> calls;
@@ -60,11 +54,10 @@ public:
 
 private:
     template <typename... Result>
-    void record(const char* operation, const QVariantMap& params,
-                const std::function<void(bool, Result...)>& callback) {
-        calls.append({operation, params, [callback](bool ok, const QVariant& payload) {
-                          callback(ok, qvariant_cast<std::decay_t<Result>>(payload)...);
-                      }});
+    void record(const std::function<void(bool, Result...)>& callback) {
+        calls.append({[callback](bool ok, const QVariant& payload) {
+            callback(ok, qvariant_cast<std::decay_t<Result>>(payload)...);
+        }});
         if (onCall)
             onCall(calls.last());
     }

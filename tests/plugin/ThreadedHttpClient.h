@@ -1,6 +1,6 @@
 #pragma once
 
-#include "ISimpleHTTPClient.h"
+#include "AnsweringHttpClient.h"
 
 #include <chrono>
 #include <condition_variable>
@@ -11,59 +11,58 @@
 #include <thread>
 #include <utility>
 
-// The moments of a slow call, shared with a test that holds no reference to the client.
-struct SlowCall {
+// Answers each request of the host forms with success, in order, on a thread of its own, as the
+// real client does: "zoom=2 maxratio=20" to a ratio query, "OK" to the rest. The first Get whose
+// path holds slowMarker is slow: it holds its caller (a reply callback on the client's thread)
+// until the test releases it. Destroyed on its own thread (its last holder let go in a reply
+// callback), it cannot join itself: the thread then ends on its own.
+class ThreadedHttpClient : public AnsweringHttpClient {
+public:
     static constexpr std::chrono::seconds DEADLINE{15};
 
-    bool waitUntilEntered() const {
-        return enteredFuture.wait_for(DEADLINE) == std::future_status::ready;
-    }
-    void release() { released.set_value(); }
+    // Shared with the thread and the test, which may each outlive the client.
+    struct Shared {
+        std::mutex mutex;
+        std::condition_variable wake;
+        std::deque<std::pair<QString, HttpReplyCallback>> pending;
+        bool stopping = false;
+        std::promise<void> slowEntered;
+        std::promise<void> slowReleased;
+        std::promise<void> finished;
+    };
 
-    std::promise<void> entered;
-    std::shared_future<void> enteredFuture = entered.get_future().share();
-    std::promise<void> released;
-    std::shared_future<void> releasedFuture = released.get_future().share();
-};
-
-// Answers each request with success, in order, on a thread of its own, as the real client does.
-// Its answer to a ratio query is "zoom=2 maxratio=20". The first Get whose path holds slowMarker
-// is slow: the call holds its caller (a reply callback on the client's thread) until the test
-// releases it. Destroyed on its own thread (its last holder let go in a reply callback), it cannot
-// join itself: the thread then ends on its own and finished() tells when.
-class ThreadedHttpClient : public ISimpleHTTPClient {
-public:
-    ThreadedHttpClient(QString slowMarker, std::shared_ptr<SlowCall> slow)
-        : slowMarker(std::move(slowMarker))
-        , slow(std::move(slow))
-        , finishedFuture(state->finished.get_future().share())
-        , thread(run, state) {}
+    explicit ThreadedHttpClient(QString slowMarker)
+        : AnsweringHttpClient(nullptr)
+        , slowMarker(std::move(slowMarker))
+        , thread(run, shared) {}
 
     ~ThreadedHttpClient() override {
-        std::deque<Pending> pending;
+        std::deque<std::pair<QString, HttpReplyCallback>> pending;
         {
-            std::lock_guard<std::mutex> lock(state->mutex);
-            state->stopping = true;
-            pending.swap(state->pending);
+            std::lock_guard<std::mutex> lock(shared->mutex);
+            shared->stopping = true;
+            pending.swap(shared->pending);
         }
-        state->wake.notify_all();
+        shared->wake.notify_all();
         if (thread.get_id() == std::this_thread::get_id())
             thread.detach();
         else
             thread.join();
         // What is still pending is cancelled, as the real client does when it goes.
-        for (const Pending& request : pending)
-            request.callback(QNetworkReply::OperationCanceledError, {}, {}, false);
+        for (const auto& request : pending)
+            request.second(QNetworkReply::OperationCanceledError, {}, {}, false);
     }
 
-    std::shared_future<void> finished() const { return finishedFuture; }
+    std::shared_ptr<Shared> state() const { return shared; }
 
+    using AnsweringHttpClient::Get;
+    using AnsweringHttpClient::Post;
     bool Get(const QString&, const QString& path, quint16, bool, const QString&, const QString&,
              HttpReplyCallback callback, uint, const QStringList&) override {
         if (path.contains(slowMarker) && !slowSeen) {
             slowSeen = true;
-            slow->entered.set_value();
-            slow->releasedFuture.wait_for(SlowCall::DEADLINE);
+            shared->slowEntered.set_value();
+            shared->slowReleased.get_future().wait_for(DEADLINE);
         }
         return enqueue(path, std::move(callback));
     }
@@ -71,75 +70,41 @@ public:
               const QString&, const QString&, HttpReplyCallback callback, uint) override {
         return enqueue(path, std::move(callback));
     }
-    bool Get(const QString&, const QString&, const QString&, HttpReplyCallback, uint) override {
-        return false;
-    }
-    bool Post(const QString&, const QByteArray&, const QString&, const QString&, const QString&,
-              HttpReplyCallback, uint, const QStringList&) override {
-        return false;
-    }
-    bool PostWithOAuth(const QString&, const QByteArray&, const QString&, quint16, bool,
-                       const QString&, const QString&, const QString&, HttpReplyCallback,
-                       uint) override {
-        return false;
-    }
-    bool Delete(const QString&, const QByteArray&, const QString&, quint16, bool, const QString&,
-                const QString&, const QString&, HttpReplyCallback, uint) override {
-        return false;
-    }
-    bool Put(const QString&, const QByteArray&, const QString&, quint16, bool, const QString&,
-             const QString&, const QString&, HttpReplyCallback, uint) override {
-        return false;
-    }
 
 private:
-    struct Pending {
-        QString path;
-        HttpReplyCallback callback;
-    };
-    // Shared with the thread, which may outlive this object.
-    struct State {
-        std::mutex mutex;
-        std::condition_variable wake;
-        std::deque<Pending> pending;
-        bool stopping = false;
-        std::promise<void> finished;
-    };
-
     bool enqueue(const QString& path, HttpReplyCallback callback) {
         {
-            std::lock_guard<std::mutex> lock(state->mutex);
-            if (state->stopping)
+            std::lock_guard<std::mutex> lock(shared->mutex);
+            if (shared->stopping)
                 return false;
-            state->pending.push_back({path, std::move(callback)});
+            shared->pending.emplace_back(path, std::move(callback));
         }
-        state->wake.notify_all();
+        shared->wake.notify_all();
         return true;
     }
 
-    static void run(std::shared_ptr<State> state) {
+    static void run(std::shared_ptr<Shared> shared) {
         for (;;) {
-            Pending request;
+            std::pair<QString, HttpReplyCallback> request;
             {
-                std::unique_lock<std::mutex> lock(state->mutex);
-                state->wake.wait(lock, [&] { return state->stopping || !state->pending.empty(); });
-                if (state->stopping)
+                std::unique_lock<std::mutex> lock(shared->mutex);
+                shared->wake.wait(lock,
+                                  [&] { return shared->stopping || !shared->pending.empty(); });
+                if (shared->stopping)
                     break;
-                request = std::move(state->pending.front());
-                state->pending.pop_front();
+                request = std::move(shared->pending.front());
+                shared->pending.pop_front();
             }
-            const QByteArray body = request.path.contains(QLatin1String("getratio"))
-                                        ? QByteArrayLiteral("zoom=2\nmaxratio=20\n")
-                                        : QByteArrayLiteral("OK\n");
-            request.callback(QNetworkReply::NoError, {}, body, true);
+            // Outside the lock: the callback may hold the client's last reference.
+            request.second(QNetworkReply::NoError, {},
+                           request.first.contains("getratio") ? "zoom=2\nmaxratio=20\n" : "OK\n",
+                           true);
         }
-        state->finished.set_value();
+        shared->finished.set_value();
     }
 
     const QString slowMarker;
-    const std::shared_ptr<SlowCall> slow;
     bool slowSeen = false; // touched on the client's thread only
-    std::shared_ptr<State> state = std::make_shared<State>();
-    std::shared_future<void> finishedFuture;
+    const std::shared_ptr<Shared> shared = std::make_shared<Shared>();
     std::thread thread;
 };

@@ -23,16 +23,20 @@ bool ListeningProcess::start(const QString& program, const QStringList& argument
     process.setChildProcessModifier([] { prctl(PR_SET_PDEATHSIG, SIGKILL); });
 #endif
     process.start(program, arguments);
-    QDeadlineTimer deadline(START_TIMEOUT_MS);
-    while (!process.canReadLine()) {
-        if (deadline.hasExpired() || !process.waitForReadyRead(deadline.remainingTime()))
-            return false;
-    }
-    const QString line = QString::fromUtf8(process.readLine()).trimmed();
     const QRegularExpressionMatch match =
-        QRegularExpression(QStringLiteral("^listening on https?://.+:(\\d+)$")).match(line);
+        QRegularExpression(QStringLiteral("^listening on https?://.+:(\\d+)$"))
+            .match(readLine(START_TIMEOUT_MS));
     listenPort = static_cast<quint16>(match.captured(1).toUInt());
     return listenPort != 0;
+}
+
+QString ListeningProcess::readLine(int timeoutMs) {
+    const QDeadlineTimer deadline(timeoutMs);
+    while (!process.canReadLine()) {
+        if (deadline.hasExpired() || !process.waitForReadyRead(deadline.remainingTime()))
+            return QString();
+    }
+    return QString::fromUtf8(process.readLine()).trimmed();
 }
 
 QString ListeningProcess::errorOutput() const {

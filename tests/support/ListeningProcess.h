@@ -13,7 +13,11 @@ public:
     bool start(const QString& program, const QStringList& arguments,
                const QProcessEnvironment& environment = QProcessEnvironment::systemEnvironment());
     quint16 port() const { return listenPort; }
+    // 0 once it has ended.
+    qint64 processId() const { return process.processId(); }
     QString errorOutput() const;
+    // The next line of standard output, trimmed; null when none came within timeoutMs.
+    QString readLine(int timeoutMs);
     // Stops the process; returns its exit code, or -1 when it did not end normally.
     int stop();
 

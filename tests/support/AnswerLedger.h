@@ -12,7 +12,8 @@
 #include <mutex>
 
 // Counts the answers that each client request gets, on any thread, keeping the first one and when
-// it came. The callbacks share the state, so they may outlive the ledger.
+// it came, and those that came after close(). The callbacks share the state, so they may outlive
+// the ledger.
 class AnswerLedger {
 public:
     struct Entry {
@@ -31,6 +32,8 @@ public:
                                      const QVariant& payload) {
             std::lock_guard<std::mutex> lock(shared->mutex);
             ++shared->calls;
+            if (shared->closed)
+                ++shared->late;
             Entry& entry = shared->entries[id];
             if (entry.calls++ == 0)
                 entry = Entry{1,
@@ -59,6 +62,16 @@ public:
         return found == shared->entries.end() ? Entry() : found->second;
     }
 
+    // Answers from now on count as late, such as those after a plugin's destructor returned.
+    void close() {
+        std::lock_guard<std::mutex> lock(shared->mutex);
+        shared->closed = true;
+    }
+    int late() const {
+        std::lock_guard<std::mutex> lock(shared->mutex);
+        return shared->late;
+    }
+
     // All answers so far, to any request.
     int calls() const {
         std::lock_guard<std::mutex> lock(shared->mutex);
@@ -71,6 +84,8 @@ private:
         QElapsedTimer clock;
         std::map<int, Entry> entries;
         int calls = 0;
+        bool closed = false;
+        int late = 0;
     };
     std::shared_ptr<Shared> shared = std::make_shared<Shared>();
 };
