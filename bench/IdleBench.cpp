@@ -9,13 +9,13 @@
 //
 //   quenvar-bench-idle --port 9001 [--cameras 10000] [--warmup 1024] [--in-flight 64]
 //                      [--idle-ms 2000]
+#include "ResidentMemory.h"
 #include "Wendrel.h"
 
 #include <QCommandLineParser>
 #include <QCoreApplication>
 #include <QDir>
 #include <QEventLoop>
-#include <QFile>
 #include <QFileInfo>
 #include <QJsonDocument>
 #include <QJsonObject>
@@ -27,17 +27,8 @@
 #include <cstdio>
 #include <malloc.h>
 #include <memory>
-#include <unistd.h>
 
 namespace {
-
-qint64 residentBytes() {
-    QFile statm(QStringLiteral("/proc/self/statm"));
-    if (!statm.open(QIODevice::ReadOnly))
-        return 0;
-    const QList<QByteArray> fields = statm.readAll().split(' ');
-    return fields.size() > 1 ? fields.at(1).toLongLong() * sysconf(_SC_PAGESIZE) : 0;
-}
 
 // Freed memory that the allocator still holds is given back first, so that what is left is
 // what the process still uses.

@@ -4,12 +4,12 @@
 //
 //   quenvar-bench-memory --ports 9001[,9002...] [--count 10000]
 #include "PluginQuenvarDefs.h"
+#include "ResidentMemory.h"
 #include "camera/CameraProxy.h"
 
 #include <QCommandLineParser>
 #include <QCoreApplication>
 #include <QEventLoop>
-#include <QFile>
 #include <QJsonDocument>
 #include <QJsonObject>
 #include <QTcpServer>
@@ -21,7 +21,6 @@
 #include <cstdio>
 #include <malloc.h>
 #include <memory>
-#include <unistd.h>
 #include <vector>
 
 namespace {
@@ -31,14 +30,6 @@ using Clock = std::chrono::steady_clock;
 // The camera proxy's request deadline.
 const auto DEADLINE = std::chrono::milliseconds(10000);
 const int SAMPLE_INTERVAL_MS = 50;
-
-qint64 residentBytes() {
-    QFile statm(QStringLiteral("/proc/self/statm"));
-    if (!statm.open(QIODevice::ReadOnly))
-        return 0;
-    const QList<QByteArray> fields = statm.readAll().split(' ');
-    return fields.size() > 1 ? fields.at(1).toLongLong() * sysconf(_SC_PAGESIZE) : 0;
-}
 
 QVariantMap camera(quint16 port) {
     return {{KEY_HOST, QStringLiteral("127.0.0.1")}, {KEY_PORT, port}, {KEY_USE_SSL, false}};

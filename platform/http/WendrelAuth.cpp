@@ -46,15 +46,6 @@ bool isQuotable(const QByteArray& text) {
     return true;
 }
 
-// The last guard before the wire: no control character, CR, LF and NUL above all.
-bool isSafeHeaderValue(const QByteArray& value) {
-    for (const char c : value) {
-        if (static_cast<unsigned char>(c) < 0x20 || c == 0x7f)
-            return false;
-    }
-    return true;
-}
-
 // RFC 7616, section 3.4.4: username, username* or the user hash.
 QByteArray usernameParameter(const WendrelChallenge& challenge, const QString& user) {
     const QByteArray bytes = user.toUtf8();
@@ -166,7 +157,8 @@ QByteArray WendrelAuth::respond(const WendrelChallenge& challenge, const QByteAr
         header = "Basic " + (user.toUtf8() + ':' + password.toUtf8()).toBase64();
     else if (challenge.scheme == WendrelChallenge::Scheme::Digest && challenge.answerable())
         header = digestAnswer(challenge, method, target, user, password, clientNonce, count);
-    return isSafeHeaderValue(header) ? header : QByteArray();
+    // The last guard before the wire: no control character, CR, LF and NUL above all.
+    return WendrelChallenge::hasControl(header) ? QByteArray() : header;
 }
 
 QByteArray WendrelAuth::target(const QUrl& url) {

@@ -43,14 +43,6 @@ bool isToken68Char(char c) {
     return isAlphaNumeric(c) || (c != '\0' && std::strchr("-._~+/", c));
 }
 
-bool hasControl(const QByteArray& value) {
-    for (const char c : value) {
-        if (static_cast<unsigned char>(c) < 0x20 || c == 0x7f)
-            return true;
-    }
-    return false;
-}
-
 bool isTrue(const QByteArray& value) {
     return value.compare("true", Qt::CaseInsensitive) == 0;
 }
@@ -150,7 +142,7 @@ void readAlgorithm(WendrelChallenge& challenge, QByteArray name) {
 
 // False when the value may not be kept: too long, or with a control character.
 bool apply(WendrelChallenge& challenge, Parameter parameter, QByteArray value) {
-    if (value.size() > WendrelChallenge::maxValueBytes || hasControl(value))
+    if (value.size() > WendrelChallenge::maxValueBytes || WendrelChallenge::hasControl(value))
         return false;
     value.squeeze();
     switch (parameter) {
@@ -246,6 +238,14 @@ std::optional<WendrelChallenge> WendrelChallenge::choose(const QByteArray& text)
             return challenge;
     }
     return std::nullopt;
+}
+
+bool WendrelChallenge::hasControl(const QByteArray& value) {
+    for (const char c : value) {
+        if (static_cast<unsigned char>(c) < 0x20 || c == 0x7f)
+            return true;
+    }
+    return false;
 }
 
 bool WendrelChallenge::answerable() const {

@@ -26,6 +26,9 @@ public:
     // Basic one; none when the field is refused or offers neither.
     static std::optional<WendrelChallenge> choose(const QByteArray& text);
 
+    // Whether value holds a control character (CR, LF and NUL among them): no header may.
+    static bool hasControl(const QByteArray& value);
+
     bool answerable() const;
     // As an answer names it: "MD5", "SHA-256-sess", ...
     QByteArray algorithmName() const;

@@ -9,18 +9,6 @@
 #include <cstdint>
 #include <cstdlib>
 
-namespace {
-
-bool hasControl(const QByteArray& text) {
-    for (const char c : text) {
-        if (static_cast<unsigned char>(c) < 0x20 || c == 0x7f)
-            return true;
-    }
-    return false;
-}
-
-} // namespace
-
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     const QByteArray text(reinterpret_cast<const char*>(data), static_cast<qsizetype>(size));
     if (const auto challenges = WendrelChallenge::parse(text)) {
@@ -31,13 +19,13 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     if (!chosen)
         return 0;
     for (const QByteArray* value : {&chosen->realm, &chosen->nonce, &chosen->opaque}) {
-        if (value->size() > WendrelChallenge::maxValueBytes || hasControl(*value))
+        if (value->size() > WendrelChallenge::maxValueBytes || WendrelChallenge::hasControl(*value))
             std::abort();
     }
     const QByteArray answer =
         WendrelAuth::respond(*chosen, "GET", "/cgi-bin/a.cgi?b=1", QStringLiteral("admin\"\\ é"),
                              QStringLiteral("pw"), "0a4f113b", 1);
-    if (hasControl(answer))
+    if (WendrelChallenge::hasControl(answer))
         std::abort();
     return 0;
 }
